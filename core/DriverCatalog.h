@@ -1,0 +1,15 @@
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "core/Driver.h"
+
+namespace maroset {
+
+// The driver classes a node can create, by the class name its type key selects
+// ("ClsDriverMemTag", "ClsDriverDiskTag", ...). A class that is not built yet gives a memory
+// tag driver, as an unknown type key does. Defined with the drivers.
+std::shared_ptr<Driver> CreateDriver(std::string_view className);
+
+}  // namespace maroset

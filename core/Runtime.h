@@ -1,0 +1,77 @@
+#pragma once
+
+#include <filesystem>
+#include <map>
+#include <memory>
+#include <string>
+
+#include "core/ErrorTrap.h"
+#include "platform/Clock.h"
+#include "platform/EventLoop.h"
+#include "platform/FileSystem.h"
+
+namespace maroset {
+
+class nodeDB;
+class ClsNodeDBInterface;
+
+// The process-wide state of the system, in one place: the platform (loop, clock, drive C:,
+// serial port map, Modbus port, message box), the error trap, the one nodeDB and the hidden
+// façade that drivers report through.
+//
+// current() creates the runtime on first use, on the real platform. Tests install a fresh one
+// for each test with ScopedRuntime, so no test sees another's nodes, counters or files.
+class Runtime {
+public:
+    using MessageBox = ErrorTrap::MessageBox;
+
+    // The real platform: a poll loop, the system clock, the default drive root, message boxes
+    // on standard error.
+    Runtime();
+    Runtime(std::unique_ptr<platform::EventLoop> loop, std::unique_ptr<platform::Clock> clock,
+            std::filesystem::path driveRoot);
+    ~Runtime();
+    Runtime(const Runtime&) = delete;
+    Runtime& operator=(const Runtime&) = delete;
+
+    static Runtime& current();
+    // Makes `runtime` current (nullptr: the next current() makes a default one); returns the
+    // one that was current. Used by ScopedRuntime.
+    static Runtime* exchange(Runtime* runtime);
+
+    platform::EventLoop& loop() { return *loop_; }
+    const platform::Clock& clock() const { return *clock_; }
+    platform::FileSystem& files() { return files_; }
+    ErrorTrap& trap() { return trap_; }
+
+    // Shows a modal message (the default handler writes it to standard error).
+    void MsgBox(const std::string& text);
+    void setMessageBox(MessageBox handler);
+
+    // Serial port N is "/dev/ttyS<N-1>" unless mapped.
+    std::string serialDevice(int port) const;
+    void mapSerialPort(int port, std::string device);
+
+    // The TCP port used for a coupler's Modbus port 502 (502 unless mapped, for simulators
+    // and tests that run without privileges).
+    int modbusPort() const { return modbusPort_; }
+    void setModbusPort(int port) { modbusPort_ = port; }
+
+    // The process-wide nodeDB and hidden façade, created on first use.
+    std::shared_ptr<nodeDB> nodes();
+    ClsNodeDBInterface& hiddenInterface();
+
+private:
+    std::unique_ptr<platform::EventLoop> loop_;
+    std::unique_ptr<platform::Clock> clock_;
+    platform::FileSystem files_;
+    MessageBox messageBox_;
+    ErrorTrap trap_;
+    std::map<int, std::string> serialPorts_;
+    int modbusPort_ = 502;
+    // Last, so they go first: drivers still use the loop while they shut down.
+    std::shared_ptr<nodeDB> nodeDB_;
+    std::unique_ptr<ClsNodeDBInterface> hidden_;
+};
+
+}  // namespace maroset
