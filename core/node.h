@@ -5,8 +5,8 @@
 #include <string>
 
 #include "core/Driver.h"
-#include "core/VbArray.h"
 #include "core/Variant.h"
+#include "core/VbArray.h"
 
 namespace maroset {
 
@@ -18,7 +18,7 @@ namespace maroset {
 // not set (91). A node keeps itself alive for the length of each operation, so a host may drop
 // its last reference from inside an event the operation raised.
 class node : public std::enable_shared_from_this<node> {
-public:
+  public:
     node() = default;
     // Class_Terminate: shuts the driver down.
     ~node();
@@ -55,8 +55,8 @@ public:
     // The driver object, empty until Init (for hosts that call a driver directly).
     const std::shared_ptr<Driver>& driver() const { return driver_; }
 
-private:
-    Driver& requireDriver() const;
+  private:
+    std::shared_ptr<Driver> requireDriver() const;
 
     std::shared_ptr<Driver> driver_;
     std::string driverType_;
