@@ -1,0 +1,97 @@
+#include "platform/Timer.h"
+
+#include "core/VbError.h"
+
+namespace maroset::platform {
+
+// What the loop's callbacks reach through a weak reference: it outlives the Timer only while
+// a tick is in progress, so a handler may destroy the Timer.
+struct Timer::State {
+    explicit State(EventLoop& l, Timer* t) : loop(l), owner(t) {}
+
+    EventLoop& loop;
+    Timer* owner;  // null once the Timer is destroyed
+    int32_t interval = 0;
+    bool enabled = false;
+    bool armed = false;
+    EventLoop::TimerId pending = 0;
+    bool ticking = false;   // a Tick handler is on the stack
+    bool deferred = false;  // a tick fell due while the handler was still running
+
+    void disarm() {
+        if (armed) loop.cancel(pending);
+        armed = false;
+        deferred = false;
+    }
+
+    // Starts the count afresh.
+    void arm(const std::shared_ptr<State>& self) {
+        disarm();
+        if (enabled && interval > 0) schedule(self, EventLoop::Duration(interval));
+    }
+
+    void schedule(const std::shared_ptr<State>& self, EventLoop::Duration delay) {
+        pending = loop.schedule(delay, [weak = std::weak_ptr<State>(self)] { fire(weak); });
+        armed = true;
+    }
+
+    static void fire(const std::weak_ptr<State>& weak) {
+        const std::shared_ptr<State> s = weak.lock();
+        if (!s || !s->owner) return;
+        s->armed = false;
+        if (!s->enabled || s->interval <= 0) return;
+        if (s->ticking) {
+            // Never re-enter the handler (it pumped the loop): tick once it returns.
+            s->deferred = true;
+            return;
+        }
+        // The next tick is counted from this one, not from the end of the handler.
+        s->schedule(s, EventLoop::Duration(s->interval));
+        {
+            struct TickScope {
+                State& s;
+                ~TickScope() { s.ticking = false; }
+            } scope{*s};
+            s->ticking = true;
+            s->owner->Tick.raise();
+        }
+        if (s->deferred && s->owner && s->enabled && s->interval > 0 && !s->armed) {
+            s->deferred = false;
+            s->schedule(s, EventLoop::Duration(0));  // the missed tick, at the next turn
+        }
+    }
+};
+
+Timer::Timer(EventLoop& loop) : state_(std::make_shared<State>(loop, this)) {}
+
+Timer::~Timer() {
+    state_->disarm();
+    state_->owner = nullptr;
+}
+
+int32_t Timer::Interval() const {
+    return state_->interval;
+}
+
+void Timer::Interval(int32_t ms) {
+    // The timer control refuses a negative interval.
+    if (ms < 0) throw VbError(380, "Invalid property value");
+    state_->interval = ms;
+    if (state_->enabled) state_->arm(state_);
+}
+
+bool Timer::Enabled() const {
+    return state_->enabled;
+}
+
+void Timer::Enabled(bool on) {
+    // Enabling a timer that already runs keeps its count: restarting takes disable, enable.
+    if (on == state_->enabled) return;
+    state_->enabled = on;
+    if (on)
+        state_->arm(state_);
+    else
+        state_->disarm();
+}
+
+}  // namespace maroset::platform
