@@ -14,7 +14,7 @@ namespace maroset {
 // elements has upper bound lower - 1.
 template <class T>
 class VbArray {
-public:
+  public:
     VbArray() = default;
     VbArray(int32_t lower, int32_t upper) { ReDim(lower, upper); }
     VbArray(int32_t lower, std::vector<T> items) : lower_(lower), items_(std::move(items)) {}
@@ -29,14 +29,16 @@ public:
 
     // ReDim: new bounds, every element reset.
     void ReDim(int32_t lower, int32_t upper) {
-        if (upper < lower - 1) throw VbError(err::SubscriptOutOfRange);
+        const int64_t count = static_cast<int64_t>(upper) - lower + 1;
+        if (count < 0) throw VbError(err::SubscriptOutOfRange);
+        items_.assign(static_cast<size_t>(count), T{});
         lower_ = lower;
-        items_.assign(static_cast<size_t>(upper - lower + 1), T{});
     }
     // ReDim Preserve: only the upper bound may move; elements kept where they still fit.
     void ReDimPreserve(int32_t upper) {
-        if (upper < lower_ - 1) throw VbError(err::SubscriptOutOfRange);
-        items_.resize(static_cast<size_t>(upper - lower_ + 1));
+        const int64_t count = static_cast<int64_t>(upper) - lower_ + 1;
+        if (count < 0) throw VbError(err::SubscriptOutOfRange);
+        items_.resize(static_cast<size_t>(count));
     }
 
     const std::vector<T>& items() const noexcept { return items_; }
@@ -47,7 +49,7 @@ public:
 
     friend bool operator==(const VbArray&, const VbArray&) = default;
 
-private:
+  private:
     size_t offset(int32_t index) const {
         const int64_t off = static_cast<int64_t>(index) - lower_;
         if (off < 0 || off >= static_cast<int64_t>(items_.size()))
