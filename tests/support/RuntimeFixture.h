@@ -17,7 +17,7 @@ namespace maroset::test {
 // A fresh runtime for each test: a virtual loop whose clock starts at 3/7/2026 9:00:00 AM,
 // a temporary drive root, and message boxes recorded instead of shown.
 class RuntimeFixture : public ::testing::Test {
-protected:
+  protected:
     RuntimeFixture();
     ~RuntimeFixture() override;
 
@@ -30,7 +30,7 @@ protected:
 
     std::vector<std::string> messageBoxes;
 
-private:
+  private:
     TempDir drive_;
     platform::VirtualEventLoop* loop_;
     ScopedRuntime scope_;

@@ -1,0 +1,239 @@
+#include "core/nodeDB.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "core/Runtime.h"
+#include "support/HostRecorder.h"
+#include "support/RuntimeFixture.h"
+#include "support/SqlScript.h"
+
+namespace maroset {
+namespace {
+
+constexpr const char* kNodesTable =
+    "create table Nodes (Name text, Driver text, OPCServer text, OPCTopic text, "
+    "UpdateRate integer, CommPort integer, BaudRate integer, TagPrefex text, "
+    "IPAddress text, Port integer);";
+
+class NodeDBTest : public test::RuntimeFixture {
+  protected:
+    nodeDB& db() { return *host.host.nodeDB(); }
+    std::string project(const std::string& rows, const std::string& table = kNodesTable) {
+        const auto file = driveRoot() / "project.db";
+        test::RunSqlScript(file, table + rows);
+        return file.string();
+    }
+    std::vector<std::string> names() {
+        std::vector<std::string> result;
+        for (const auto& n : db().nodes()) result.push_back(n->Name);
+        return result;
+    }
+    int32_t loadError(const std::string& file) {
+        try {
+            db().AddAllNodes(file);
+        } catch (const VbError& e) {
+            return e.number();
+        }
+        return 0;
+    }
+    size_t logRecords() {
+        const std::string log = readDriveFile("MarosetErrors.txt");
+        size_t n = 0;
+        for (size_t at = log.find("Date: "); at != std::string::npos;
+             at = log.find("Date: ", at + 1))
+            ++n;
+        return n;
+    }
+    test::HostRecorder host;
+};
+
+TEST_F(NodeDBTest, DriverListsAreOneBasedWithTheirExactTexts) {
+    const Variant drivers = db().GetDrivers();
+    const Variant types = db().GetDriverType();
+    ASSERT_TRUE(drivers.isArray());
+    ASSERT_TRUE(types.isArray());
+    EXPECT_EQ(drivers.array().LBound(), 1);
+    EXPECT_EQ(drivers.array().UBound(), 7);
+    EXPECT_EQ(types.array().LBound(), 1);
+    EXPECT_EQ(types.array().UBound(), 7);
+    const char* names[] = {"MEMTAG", "OPC",       "NUVABDF1", "DiskTag",
+                           "WagoIO", "NUVIntech", "NUVTCPIP"};
+    const char* numbers[] = {"1", "2", "3", "4", "5", "3", "2"};
+    for (int i = 1; i <= 7; ++i) {
+        EXPECT_EQ(drivers.array()(i), Variant(names[i - 1]));
+        EXPECT_EQ(types.array()(i), Variant(numbers[i - 1]));
+    }
+}
+
+TEST_F(NodeDBTest, KeysIgnoreLetterCase) {
+    db().AddNode("Line1", "MEMTAG");
+    EXPECT_EQ(db().getNode("LINE1"), db().getNode("Line1"));
+    try {
+        db().AddNode("line1", "MEMTAG");
+        FAIL();
+    } catch (const VbError& e) {
+        EXPECT_EQ(e.number(), err::DuplicateKey);
+    }
+    EXPECT_EQ(db().count(), 1);
+}
+
+TEST_F(NodeDBTest, GetNodeOfAnUnknownNameIsNothingEvenWithTheTrapOn) {
+    EXPECT_EQ(db().getNode("nope"), nullptr);
+    runtime().trap().setEnabled(true);
+    EXPECT_EQ(db().getNode("nope"), nullptr);
+    EXPECT_EQ(logRecords(), 0u);
+}
+
+TEST_F(NodeDBTest, RemoveNodeOfAnUnknownNameFails) {
+    try {
+        db().RemoveNode("nope");
+        FAIL();
+    } catch (const VbError& e) {
+        EXPECT_EQ(e.number(), err::InvalidProcedureCall);
+    }
+}
+
+TEST_F(NodeDBTest, AddNodeFillsItsPropertiesInOrderWithDefaults) {
+    db().AddNode("A", "memtag");
+    db().AddNode("B", "MEMTAG", "topic", 250, 3);
+    const auto a = db().getNode("A");
+    ASSERT_TRUE(a && a->driver());
+    EXPECT_EQ(a->OPCTopic, Variant(""));
+    EXPECT_EQ(a->ScanRate, Variant(0));
+    EXPECT_EQ(a->TagPrefex, Variant(0));
+    EXPECT_TRUE(a->ServerName.isEmpty());
+    const auto b = db().getNode("B");
+    EXPECT_EQ(b->ScanRate, Variant(250));
+    EXPECT_EQ(b->TagPrefex, Variant(3));
+    EXPECT_EQ(names(), (std::vector<std::string>{"A", "B"}));
+}
+
+TEST_F(NodeDBTest, RemoveAllNodesEmptiesAndScanningAnEmptyCollectionDoesNothing) {
+    db().AddNode("A", "MEMTAG");
+    db().AddNode("B", "MEMTAG");
+    std::weak_ptr<node> a = db().getNode("A");
+    db().StartScanning();
+    db().RemoveAllNodes();
+    EXPECT_EQ(db().count(), 0);
+    EXPECT_TRUE(a.expired());
+    EXPECT_NO_THROW(db().StartScanning());
+    EXPECT_NO_THROW(db().StopScanning());
+    db().AddNode("A", "MEMTAG");  // a new collection on next use
+    EXPECT_EQ(db().count(), 1);
+}
+
+TEST_F(NodeDBTest, NodeWhoseInitFailedStaysWithoutDriverAndStopsScanning) {
+    const auto file = project(
+        "insert into Nodes (Name, Driver) values ('A', null);"
+        "insert into Nodes (Name, Driver) values ('B', 'MEMTAG');");
+    EXPECT_EQ(loadError(file), err::InvalidUseOfNull);
+    EXPECT_EQ(names(), std::vector<std::string>{"A"});
+    EXPECT_FALSE(db().getNode("A")->driver());
+    try {
+        db().StartScanning();
+        FAIL();
+    } catch (const VbError& e) {
+        EXPECT_EQ(e.number(), err::ObjectNotSet);
+    }
+    runtime().trap().setEnabled(true);
+    EXPECT_NO_THROW(db().StartScanning());
+    EXPECT_EQ(logRecords(), 6u);
+}
+
+TEST_F(NodeDBTest, NewValueWithCountZeroStillRaises) {
+    VbArray<int32_t> ids(1, 0);
+    VbArray<Variant> values(1, 0);
+    db().NewValue(ids, 0, values);
+    ASSERT_EQ(host.changes.size(), 1u);
+    EXPECT_EQ(host.changes[0].count, 0);
+}
+
+TEST_F(NodeDBTest, NuvErrorRaisesDriverErrorWithTheThreeTexts) {
+    db().NUVError("OPC Driver", "ClsDriverOPC.ReadItem", "ClientHandle: 4 Error: bad");
+    ASSERT_EQ(host.errors.size(), 1u);
+    EXPECT_EQ(host.errors[0].driver, "OPC Driver");
+    EXPECT_EQ(host.errors[0].from, "ClsDriverOPC.ReadItem");
+    EXPECT_EQ(host.errors[0].message, "ClientHandle: 4 Error: bad");
+}
+
+TEST_F(NodeDBTest, LoadsRowsInOrderWithValuesAsDelivered) {
+    const auto file = project(
+        "insert into Nodes values ('Line1','memtag','srv','top',500,2,19200,'pre','10.0.0.5',502);"
+        "insert into Nodes values ('Mixer','XYZ',null,null,null,null,null,null,null,null);"
+        "insert into Nodes values (42,'',null,null,1000,null,null,null,null,null);");
+    db().AddAllNodes(file);
+    EXPECT_EQ(names(), (std::vector<std::string>{"Line1", "Mixer", "42"}));
+    const auto line1 = db().getNode("Line1");
+    EXPECT_EQ(line1->DriverName, Variant("memtag"));
+    EXPECT_EQ(line1->ServerName, Variant("srv"));
+    EXPECT_EQ(line1->OPCTopic, Variant("top"));
+    EXPECT_EQ(line1->ScanRate, Variant(500));
+    EXPECT_EQ(line1->SerialPort, Variant(2));
+    EXPECT_EQ(line1->BaudRate, Variant(19200));
+    EXPECT_EQ(line1->TagPrefex, Variant("pre"));
+    EXPECT_EQ(line1->IPAddress, Variant("10.0.0.5"));
+    EXPECT_EQ(line1->Port, Variant(502));
+    EXPECT_TRUE(db().getNode("Mixer")->ServerName.isNull());
+    for (const auto& n : db().nodes()) EXPECT_TRUE(n->driver()) << n->Name;
+}
+
+TEST_F(NodeDBTest, EmptyTableLoadsNothingAndRaisesNothing) {
+    EXPECT_EQ(loadError(project("")), 0);
+    EXPECT_EQ(db().count(), 0);
+}
+
+TEST_F(NodeDBTest, MissingFileTableOrColumnEndsTheLoad) {
+    EXPECT_EQ(loadError((driveRoot() / "absent.db").string()), err::CouldNotFindFile);
+    EXPECT_EQ(loadError(project("", "create table Other (x);")), err::TableNotFound);
+    std::filesystem::remove(driveRoot() / "project.db");
+    EXPECT_EQ(loadError(project("insert into Nodes values ('A','MEMTAG');",
+                                "create table Nodes (Name text, Driver text);")),
+              err::ItemNotFound);
+    EXPECT_EQ(db().count(), 0);
+}
+
+TEST_F(NodeDBTest, DuplicateNameEndsTheLoadAtThatRow) {
+    const auto file = project(
+        "insert into Nodes (Name, Driver) values ('A','MEMTAG');"
+        "insert into Nodes (Name, Driver) values ('B','MEMTAG');"
+        "insert into Nodes (Name, Driver) values ('a','MEMTAG');"
+        "insert into Nodes (Name, Driver) values ('C','MEMTAG');");
+    EXPECT_EQ(loadError(file), err::DuplicateKey);
+    EXPECT_EQ(names(), (std::vector<std::string>{"A", "B"}));
+    EXPECT_TRUE(db().getNode("B")->driver());
+}
+
+TEST_F(NodeDBTest, TrappedDuplicateIsLoggedSixTimesThenSkipped) {
+    runtime().trap().setEnabled(true);
+    const auto file = project(
+        "insert into Nodes (Name, Driver) values ('A','MEMTAG');"
+        "insert into Nodes (Name, Driver) values ('A','MEMTAG');"
+        "insert into Nodes (Name, Driver) values ('C','MEMTAG');");
+    EXPECT_EQ(loadError(file), 0);
+    EXPECT_EQ(names(), (std::vector<std::string>{"A", "C"}));
+    EXPECT_EQ(logRecords(), 6u);
+    const std::string log = readDriveFile("MarosetErrors.txt");
+    EXPECT_NE(log.find("Module\\Sub: NodeDB.AddAllNodes 0\r\n"), std::string::npos);
+    EXPECT_NE(log.find("Message: Error #457 was generated by Maroset.NodeDB\r\n"),
+              std::string::npos);
+}
+
+TEST_F(NodeDBTest, LoadingTwiceFailsOnTheFirstRowAgain) {
+    const auto file = project("insert into Nodes (Name, Driver) values ('A','MEMTAG');");
+    db().AddAllNodes(file);
+    EXPECT_EQ(loadError(file), err::DuplicateKey);
+    EXPECT_EQ(db().count(), 1);
+}
+
+TEST_F(NodeDBTest, TrappedMissingFileEndsTheLoadWithoutLooping) {
+    runtime().trap().setEnabled(true);
+    EXPECT_EQ(loadError((driveRoot() / "absent.db").string()), 0);
+    EXPECT_EQ(db().count(), 0);
+    EXPECT_GE(logRecords(), 6u);
+}
+
+}  // namespace
+}  // namespace maroset

@@ -1,0 +1,175 @@
+#include "core/node.h"
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+
+#include "core/Runtime.h"
+#include "support/HostRecorder.h"
+#include "support/RuntimeFixture.h"
+
+namespace maroset {
+namespace {
+
+class NodeTest : public test::RuntimeFixture {
+  protected:
+    std::shared_ptr<node> makeNode(const Variant& driver, const std::string& name = "N1") {
+        auto n = std::make_shared<node>();
+        n->Name = name;
+        n->DriverName = driver;
+        return n;
+    }
+    test::HostRecorder host;
+};
+
+TEST_F(NodeTest, TypeKeySelectsDriverInAnyCaseAndFallsBackToMemoryTags) {
+    for (const Variant& key : {Variant("memtag"), Variant("MemTag"), Variant("XYZ"), Variant(""),
+                               Variant(), Variant(7)}) {
+        auto n = makeNode(key);
+        n->Init();
+        ASSERT_TRUE(n->driver()) << ::testing::PrintToString(key);
+        EXPECT_STREQ(n->driver()->className(), "ClsDriverMemTag");
+        EXPECT_EQ(n->driver()->NodeName(), "N1");
+    }
+}
+
+TEST_F(NodeTest, NullTypeKeyFailsInit) {
+    auto n = makeNode(Variant::Null());
+    try {
+        n->Init();
+        FAIL();
+    } catch (const VbError& e) {
+        EXPECT_EQ(e.number(), err::InvalidUseOfNull);
+    }
+    EXPECT_FALSE(n->driver());
+}
+
+TEST_F(NodeTest, AddTagInitialisesOnceOnly) {
+    auto n = makeNode("MEMTAG");
+    EXPECT_FALSE(n->driver());
+    n->AddTag(1, "A");
+    const auto first = n->driver();
+    ASSERT_TRUE(first);
+    n->AddTag(2, "B");
+    EXPECT_EQ(n->driver(), first);
+}
+
+TEST_F(NodeTest, InitAgainReplacesTheDriver) {
+    auto n = makeNode("MEMTAG");
+    n->Init();
+    const auto first = n->driver();
+    n->Init();
+    EXPECT_NE(n->driver(), first);
+}
+
+TEST_F(NodeTest, IsActiveReadsFalseAfterWritingTrue) {
+    auto n = makeNode("MEMTAG");
+    n->Init();
+    n->IsActive(true);
+    EXPECT_FALSE(n->IsActive());
+}
+
+TEST_F(NodeTest, HandleOutsideSixteenBitsOverflowsInAddAndRemove) {
+    auto n = makeNode("MEMTAG");
+    n->Init();
+    EXPECT_NO_THROW(n->AddTag(32767, "A"));
+    EXPECT_NO_THROW(n->AddTag(-32768, "A"));
+    for (int32_t handle : {32768, -32769, 100000}) {
+        try {
+            n->AddTag(handle, "A");
+            FAIL() << handle;
+        } catch (const VbError& e) {
+            EXPECT_EQ(e.number(), err::Overflow);
+        }
+        try {
+            n->RemoveTag(handle);
+            FAIL() << handle;
+        } catch (const VbError& e) {
+            EXPECT_EQ(e.number(), err::Overflow);
+        }
+    }
+    // Reads and writes carry 32 bits.
+    n->WriteTag("100000", 1);
+    ASSERT_EQ(host.changes.size(), 1u);
+    EXPECT_EQ(host.changes[0].handles, std::vector<int32_t>{100000});
+}
+
+TEST_F(NodeTest, WriteTagConvertsTheHandleTextBeforeTheDriverRuns) {
+    auto n = makeNode("MEMTAG");
+    n->AddTag(12, "Level");
+    EXPECT_EQ(n->WriteTag("12", 3.5), Variant());
+    ASSERT_EQ(host.changes.size(), 1u);
+    EXPECT_EQ(host.changes[0].handles, std::vector<int32_t>{12});
+
+    for (const char* bad : {"abc", "", "12x"}) {
+        try {
+            n->WriteTag(bad, 1);
+            FAIL() << bad;
+        } catch (const VbError& e) {
+            EXPECT_EQ(e.number(), err::TypeMismatch) << bad;
+            EXPECT_EQ(e.source(), "Maroset.node");
+        }
+    }
+    EXPECT_EQ(host.changes.size(), 1u);  // the driver never ran
+}
+
+TEST_F(NodeTest, OperationsBeforeInitFailWithObjectNotSet) {
+    auto n = makeNode("MEMTAG");
+    VbArray<Variant> values(0, 0);
+    const std::function<void()> ops[] = {
+        [&] { n->RemoveTag(1); },
+        [&] { n->ReadTag(1); },
+        [&] { n->WriteTag("1", 1); },
+        [&] { n->IsActive(true); },
+        [&] { n->WriteArray("1", values); },
+    };
+    for (const auto& op : ops) {
+        try {
+            op();
+            FAIL();
+        } catch (const VbError& e) {
+            EXPECT_EQ(e.number(), err::ObjectNotSet);
+        }
+    }
+}
+
+TEST_F(NodeTest, TrappedFailuresAreLoggedUnderTheNodeAndReturnEmpty) {
+    runtime().trap().setEnabled(true);
+    auto n = makeNode("MEMTAG");
+    n->Init();
+    EXPECT_EQ(n->WriteTag("abc", 1), Variant());
+    const std::string log = readDriveFile("MarosetErrors.txt");
+    EXPECT_NE(log.find("Module\\Sub: node.WriteTag 0\r\n"), std::string::npos);
+    EXPECT_NE(log.find("Description: Type mismatch\r\n"), std::string::npos);
+}
+
+TEST_F(NodeTest, IsActiveAssignmentIsNeverTrapped) {
+    runtime().trap().setEnabled(true);
+    auto n = makeNode("MEMTAG");
+    EXPECT_THROW(n->IsActive(true), VbError);
+    EXPECT_EQ(readDriveFile("MarosetErrors.txt"), "");
+}
+
+TEST_F(NodeTest, HostMayReleaseTheNodeInsideItsOwnValueChange) {
+    auto n = makeNode("MEMTAG");
+    n->Init();
+    auto sub = host.host.ValueChange.subscribe(
+        [&](VbArray<int32_t>&, int16_t, VbArray<Variant>&) { n.reset(); });
+    std::weak_ptr<node> watch = n;
+    n->WriteTag("5", 1);
+    EXPECT_FALSE(n);
+    EXPECT_TRUE(watch.expired());
+}
+
+TEST_F(NodeTest, WriteArrayReachesTheDriverButIsNotLoopedBack) {
+    auto n = makeNode("MEMTAG");
+    n->Init();
+    VbArray<Variant> values(0, 2);
+    EXPECT_EQ(n->WriteArray("4", values), Variant());
+    EXPECT_TRUE(host.changes.empty());
+    EXPECT_THROW(n->WriteArray("four", values), VbError);
+}
+
+}  // namespace
+}  // namespace maroset
