@@ -2,7 +2,6 @@
 
 #include <charconv>
 #include <cmath>
-#include <cstdio>
 #include <limits>
 
 namespace maroset {
@@ -100,9 +99,13 @@ std::string formatG(double d, int digits) {
     if (std::isnan(d)) return "-1.#IND";
     if (std::isinf(d)) return d > 0 ? "1.#INF" : "-1.#INF";
     if (d == 0.0) return "0";  // also -0
+    // to_chars rather than printf: the host's locale must not change the decimal point.
     char buf[40];
-    std::snprintf(buf, sizeof buf, "%.*G", digits, d);
-    return buf;
+    const auto res = std::to_chars(buf, buf + sizeof buf, d, std::chars_format::general, digits);
+    std::string out(buf, res.ptr);
+    for (char& c : out)
+        if (c == 'e') c = 'E';
+    return out;
 }
 
 }  // namespace

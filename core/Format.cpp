@@ -1,7 +1,7 @@
 #include "core/Format.h"
 
+#include <charconv>
 #include <cmath>
-#include <cstdio>
 #include <cstdlib>
 
 #include "core/Conversions.h"
@@ -27,7 +27,9 @@ Decimal toDecimal(double d, int significant) {
         return out;
     }
     char buf[48];
-    std::snprintf(buf, sizeof buf, "%.*e", significant - 1, std::fabs(d));
+    const auto res = std::to_chars(buf, buf + sizeof buf - 1, std::fabs(d),
+                                   std::chars_format::scientific, significant - 1);
+    *res.ptr = '\0';
     // buf is "d.ddddde+XX".
     std::string digits;
     const char* p = buf;
@@ -126,6 +128,10 @@ std::string Format(const Variant& value, std::string_view pattern) {
     }
     // Text that is not a number is shown as it is.
     if (value.isString() && !IsNumeric(value)) return value.string();
+    // Infinities and NaN cannot come from the system's own arithmetic; show them as CStr does.
+    if ((value.type() == VarType::Double && !std::isfinite(value.dbl())) ||
+        (value.type() == VarType::Single && !std::isfinite(value.single())))
+        return CStr(value);
     return formatNumber(value, minWhole, decimals);
 }
 

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <limits>
+
 namespace maroset {
 namespace {
 
@@ -68,6 +70,8 @@ TEST(FormatOneDecimal, RoundsTheDecimalValueShown) {
     EXPECT_EQ(Format(0.04, "###0.0"), "0.0");
     EXPECT_EQ(Format(1e-7, "###0.0"), "0.0");
     EXPECT_EQ(Format("2.25", "###0.0"), "2.3");
+    // A small negative value keeps its sign, as the language shows it.
+    EXPECT_EQ(Format(-0.04, "###0.0"), "-0.0");
 }
 
 TEST(FormatOneDecimal, SingleRoundsAtItsSevenDigits) {
@@ -97,6 +101,7 @@ TEST(FormatSpecialValues, NullIsEmptyTextOtherPatternsFail) {
     EXPECT_EQ(errorOf([] { Format(int32_t{1}, ""); }), 5);
     EXPECT_EQ(errorOf([] { Format("x", "0000"); }), 5);
     EXPECT_EQ(errorOf([] { Format(Variant(VbArray<Variant>(0, 0)), "000"); }), 13);
+    EXPECT_EQ(Format(std::numeric_limits<double>::infinity(), "###0.0"), "1.#INF");
 }
 
 }  // namespace
