@@ -49,7 +49,10 @@ std::optional<double> parseRadix(std::string_view s) {
         const int d = hexDigit(c);
         if (d < 0 || d >= base) return std::nullopt;
         value = value * static_cast<uint64_t>(base) + static_cast<uint64_t>(d);
-        if (value > 0xFFFFFFFFull) tooBig = true, value = 0xFFFFFFFFFull;
+        if (value > 0xFFFFFFFFull) {
+            tooBig = true;
+            value = 0x100000000ull;  // keeps the accumulator from wrapping on long input
+        }
     }
     if (tooBig) return std::numeric_limits<double>::infinity();
     if (value <= 0xFFFFu) return static_cast<double>(static_cast<int16_t>(value));
