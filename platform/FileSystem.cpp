@@ -26,14 +26,14 @@ namespace {
 // link inside it that points elsewhere is the owner's choice.
 std::vector<std::string> splitDrivePath(std::string_view path) {
     if (path.find('\0') != std::string_view::npos) fail(err::PathFileAccess);
+    auto isSep = [](char c) { return c == '\\' || c == '/'; };
     std::string_view rest = path;
     if (rest.size() >= 2 && rest[1] == ':') {
         if (rest[0] != 'C' && rest[0] != 'c') fail(err::PathFileAccess);
         rest.remove_prefix(2);
+    } else if (rest.size() >= 2 && isSep(rest[0]) && isSep(rest[1])) {
+        fail(err::PathFileAccess);  // "\\server\share": another machine, not drive C:
     }
-    // "\\server\share": another machine, not drive C:.
-    auto isSep = [](char c) { return c == '\\' || c == '/'; };
-    if (rest.size() >= 2 && isSep(rest[0]) && isSep(rest[1])) fail(err::PathFileAccess);
 
     std::vector<std::string> parts;
     size_t i = 0;

@@ -98,7 +98,7 @@ void LoopCore::runDueTimers(Duration now, const bool* stop) {
     }
 }
 
-void LoopCore::pollWatches(int timeoutMs, const bool* stop) {
+int LoopCore::pollWatches(int timeoutMs, const bool* stop) {
     std::vector<pollfd> fds;
     std::vector<std::shared_ptr<Watch>> ready;
     for (const auto& [id, w] : watches_) {
@@ -110,13 +110,14 @@ void LoopCore::pollWatches(int timeoutMs, const bool* stop) {
     }
     const int n = ::poll(fds.empty() ? nullptr : fds.data(), fds.size(), timeoutMs);
     if (n < 0) {
-        if (errno == EINTR || errno == EAGAIN) return;
+        if (errno == EINTR || errno == EAGAIN) return 0;
         throw std::system_error(errno, std::generic_category(), "poll");
     }
-    if (n == 0) return;
+    if (n == 0) return 0;
     const uint64_t pass = ++pollPass_;
+    int called = 0;
     for (size_t i = 0; i < fds.size(); ++i) {
-        if (stopped(stop)) return;
+        if (stopped(stop)) break;
         Watch& w = *ready[i];
         const short revents = fds[i].revents;
         if (revents == 0) continue;
@@ -135,8 +136,10 @@ void LoopCore::pollWatches(int timeoutMs, const bool* stop) {
         w.lastPass = pass;
         const std::shared_ptr<Watch> keep = ready[i];  // survives an unwatch inside fn
         RunningScope scope(w.running);
+        ++called;
         w.fn(report);
     }
+    return called;
 }
 
 }  // namespace maroset::platform

@@ -57,8 +57,9 @@ class LoopCore {
     // Runs the timers due at `now` that existed before this step, in due-time order.
     void runDueTimers(Duration now, const bool* stop);
     // Polls the watched descriptors (timeoutMs as poll(2): -1 waits without limit) and calls
-    // the ready ones. With nothing watched it just sleeps for the timeout.
-    void pollWatches(int timeoutMs, const bool* stop);
+    // the ready ones. With nothing watched it just sleeps for the timeout. Returns how many
+    // callbacks it called.
+    int pollWatches(int timeoutMs, const bool* stop);
 
   private:
     struct Watch {

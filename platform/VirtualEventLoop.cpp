@@ -10,14 +10,24 @@ struct VirtualEventLoop::Impl {
     Duration now{0};
     LoopCore core;
 
-    // Posted calls, timers due at the current time, then a look at the descriptors.
-    void turn(const bool* stop) {
+    // Posted calls, timers due at the current time, then a look at the descriptors. True
+    // when a descriptor was served.
+    bool turn(const bool* stop) {
         core.runPosted(stop);
-        if (stop && *stop) return;
+        if (stop && *stop) return false;
         core.runDueTimers(now, stop);
-        if (stop && *stop) return;
-        core.pollWatches(0, stop);
+        if (stop && *stop) return false;
+        return core.pollWatches(0, stop) > 0;
     }
+    // Before time moves on, descriptors are looked at again while they are being served: what
+    // one party wrote may already wait for another. Bounded, so that a descriptor nobody
+    // drains cannot hold virtual time still.
+    bool serveAgain(bool served, int& rounds) const {
+        if (served && ++rounds < kDescriptorRounds) return true;
+        rounds = 0;
+        return false;
+    }
+    static constexpr int kDescriptorRounds = 100;
     // Something still to do without moving time: posted calls or timers due now.
     bool busyNow() const {
         if (core.hasPosted()) return true;
@@ -33,10 +43,11 @@ void VirtualEventLoop::advance(Duration d) {
     Impl& m = *impl_;
     LoopCore::Frame frame(m.core);
     const Duration target = m.now + std::max(d, Duration::zero());
+    int rounds = 0;
     for (;;) {
-        m.turn(&frame.stopped);
+        const bool served = m.turn(&frame.stopped);
         if (frame.stopped) return;  // time stays where stop() was called
-        if (m.busyNow()) continue;
+        if (m.busyNow() || m.serveAgain(served, rounds)) continue;
         const auto due = m.core.nextDue();
         if (!due || *due > target) break;
         // Each timer runs at its own due time; max() keeps time monotonic after a nested
@@ -81,10 +92,11 @@ void VirtualEventLoop::pump() {
 void VirtualEventLoop::run() {
     Impl& m = *impl_;
     LoopCore::Frame frame(m.core);
+    int rounds = 0;
     for (;;) {
-        m.turn(&frame.stopped);
+        const bool served = m.turn(&frame.stopped);
         if (frame.stopped) return;
-        if (m.busyNow()) continue;
+        if (m.busyNow() || m.serveAgain(served, rounds)) continue;
         const auto due = m.core.nextDue();
         if (!due) return;  // nothing scheduled, nothing posted: a virtual loop would wait forever
         m.now = std::max(m.now, *due);

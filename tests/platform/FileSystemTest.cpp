@@ -50,6 +50,7 @@ TEST_F(DriveC, SystemPathsMapUnderTheRoot) {
     EXPECT_EQ(files.resolve("C:/a/./b/../c"), root / "a" / "c");
     EXPECT_EQ(files.resolve("C:\\NUVDiskIO\\"), root / "NUVDiskIO");
     EXPECT_EQ(files.resolve("C:"), root);
+    EXPECT_EQ(files.resolve("C:\\\\a\\\\b"), root / "a" / "b");  // doubled separators
 }
 
 TEST_F(DriveC, ResolveCreatesAMissingRoot) {

@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <string>
@@ -182,6 +183,28 @@ TEST_F(VirtualLoopWatch, ReadyDescriptorIsReportedAndNotReenteredByNestedPump) {
     EXPECT_EQ(calls, 1);
 }
 
+TEST_F(VirtualLoopWatch, WatchServedByNestedPumpIsNotCalledAgainWithAStaleReport) {
+    int other[2];
+    ASSERT_EQ(pipe2(other, O_NONBLOCK), 0);
+    int otherCalls = 0;
+    loop.watch(fds[0], EventLoop::Readable, [&](short) {
+        char c;
+        ASSERT_EQ(read(fds[0], &c, 1), 1);
+        loop.pump();  // serves and drains the other pipe
+    });
+    loop.watch(other[0], EventLoop::Readable, [&](short) {
+        ++otherCalls;
+        char c;
+        EXPECT_EQ(read(other[0], &c, 1), 1);  // a second, stale call would find nothing
+    });
+    ASSERT_EQ(write(fds[1], "a", 1), 1);
+    ASSERT_EQ(write(other[1], "b", 1), 1);
+    loop.pump();
+    EXPECT_EQ(otherCalls, 1);
+    close(other[0]);
+    close(other[1]);
+}
+
 TEST_F(VirtualLoopWatch, UnwatchInsideCallbackStopsFurtherCalls) {
     int calls = 0;
     EventLoop::WatchId id = 0;
@@ -213,6 +236,39 @@ TEST_F(VirtualLoopWatch, HangUpIsReportedWithoutAskingForIt) {
     fds[1] = -1;
     loop.pump();
     EXPECT_EQ(seen, EventLoop::HangUp);
+}
+
+TEST_F(VirtualLoopWatch, ExchangeBetweenWatchedPartiesCompletesWithoutTime) {
+    int back[2];
+    ASSERT_EQ(pipe(back), 0);
+    std::string answer;
+    // A device that answers each request at once, and the party that reads the answer.
+    loop.watch(fds[0], EventLoop::Readable, [&](short) {
+        char c;
+        if (read(fds[0], &c, 1) == 1) ASSERT_EQ(write(back[1], "ok", 2), 2);
+    });
+    loop.watch(back[0], EventLoop::Readable, [&](short) {
+        char buf[8];
+        const ssize_t n = read(back[0], buf, sizeof buf);
+        if (n > 0) answer.append(buf, static_cast<size_t>(n));
+    });
+    ASSERT_EQ(write(fds[1], "?", 1), 1);
+    loop.advance(milliseconds(0));
+    EXPECT_EQ(answer, "ok");
+    EXPECT_EQ(loop.now().count(), 0);
+    close(back[0]);
+    close(back[1]);
+}
+
+TEST_F(VirtualLoopWatch, UndrainedDescriptorDoesNotHoldTimeStill) {
+    int calls = 0;
+    loop.watch(fds[0], EventLoop::Readable, [&](short) { ++calls; });  // never reads
+    ASSERT_EQ(write(fds[1], "x", 1), 1);
+    at(500, "timer");
+    loop.advance(milliseconds(1000));
+    EXPECT_EQ(fired, (Fired{{"timer", 500}}));
+    EXPECT_EQ(loop.now().count(), 1000);
+    EXPECT_GT(calls, 0);
 }
 
 }  // namespace
