@@ -114,87 +114,8 @@ std::unique_ptr<Recordset> Database::OpenRecordset(const std::string& sql) {
     if (count == 0 || !sqlite3_stmt_readonly(s))
         throw VbError(dberr::InvalidOperation, "Invalid operation.");
 
-    std::vector<std::string> names;
-    for (int i = 0; i < count; ++i) names.emplace_back(sqlite3_column_name(s, i));
-    std::unique_ptr<Recordset> rs(new Recordset(connection_, std::move(names)));
-
-    // Rows can be changed when every field is a column of one table of this file, each
-    // column once (a join of a table with itself is not).
-    std::string table;
-    bool oneTable = true;
-    for (int i = 0; i < count && oneTable; ++i) {
-        const char* db = sqlite3_column_database_name(s, i);
-        const char* t = sqlite3_column_table_name(s, i);
-        const char* origin = sqlite3_column_origin_name(s, i);
-        if (!db || !t || !origin || std::string_view(db) != "main" || (i > 0 && table != t)) {
-            oneTable = false;
-            break;
-        }
-        table = t;
-        for (const auto& seen : rs->origins_)
-            if (NamesEqual(seen, origin)) oneTable = false;
-        rs->origins_.emplace_back(origin);
-        // The column affinity rules of SQLite, from the declared type.
-        std::string type = sqlite3_column_decltype(s, i) ? sqlite3_column_decltype(s, i) : "";
-        for (char& c : type)
-            if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 32);
-        auto has = [&](const char* part) { return type.find(part) != std::string::npos; };
-        Recordset::Affinity a = Recordset::Affinity::Numeric;
-        if (has("INT"))
-            a = Recordset::Affinity::Numeric;
-        else if (has("CHAR") || has("CLOB") || has("TEXT"))
-            a = Recordset::Affinity::Text;
-        else if (type.empty())
-            a = Recordset::Affinity::None;
-        else if (has("BLOB"))
-            a = Recordset::Affinity::Blob;
-        rs->affinities_.push_back(a);
-    }
-    if (oneTable && count > 0) {
-        // Rows are identified by rowid: a field that is the table's INTEGER PRIMARY KEY
-        // carries it; otherwise a row is found again by its values when it is first changed.
-        // A table without rowids cannot be changed through a recordset.
-        auto info = connection_->Prepare(
-            "SELECT name, type, pk, (SELECT count(*) FROM pragma_table_info(?1) WHERE pk > 0) "
-            "FROM pragma_table_info(?1) WHERE pk = 1");
-        sqlite3_bind_text(info.get(), 1, table.data(), static_cast<int>(table.size()),
-                          SQLITE_TRANSIENT);
-        if (connection_->Step(info.get(), "")) {
-            const std::string name =
-                reinterpret_cast<const char*>(sqlite3_column_text(info.get(), 0));
-            const std::string type =
-                reinterpret_cast<const char*>(sqlite3_column_text(info.get(), 1));
-            if (sqlite3_column_int(info.get(), 3) == 1 && NamesEqual(type, "INTEGER")) {
-                rs->rowidName_ = name;
-                for (int i = 0; i < count; ++i)
-                    if (NamesEqual(rs->origins_[static_cast<size_t>(i)], name)) rs->rowidField_ = i;
-            }
-        }
-        sqlite3_stmt* probe = nullptr;
-        const std::string sql2 = "SELECT rowid FROM " + QuoteIdentifier(table) + " LIMIT 0";
-        const bool hasRowid = sqlite3_prepare_v2(connection_->handle(), sql2.c_str(), -1, &probe,
-                                                 nullptr) == SQLITE_OK;
-        sqlite3_finalize(probe);
-        if (hasRowid) rs->table_ = table;
-    }
-    if (rs->table_.empty()) {
-        rs->origins_.clear();
-        rs->affinities_.clear();
-    }
-
-    while (connection_->Step(s, sql)) {
-        Recordset::Row row;
-        for (int i = 0; i < count; ++i) {
-            row.storage.push_back(static_cast<uint8_t>(sqlite3_column_type(s, i)));
-            row.values.push_back(ReadColumn(s, i));
-        }
-        if (rs->rowidField_ >= 0 &&
-            row.storage[static_cast<size_t>(rs->rowidField_)] == SQLITE_INTEGER) {
-            row.rowid = sqlite3_column_int64(s, rs->rowidField_);
-            row.hasRowid = true;
-        }
-        rs->rows_.push_back(std::move(row));
-    }
+    std::unique_ptr<Recordset> rs(new Recordset(connection_));
+    rs->load(s, sql);
     return rs;
 }
 

@@ -1,7 +1,6 @@
 #include "platform/JetLike.h"
 
-#include <cstdint>
-#include <vector>
+#include <cstddef>
 
 #include "core/VbError.h"
 
@@ -21,144 +20,164 @@ unsigned char Upper(unsigned char c) {
     return c;
 }
 
-struct Range {
-    unsigned char lo, hi;
-    bool contains(unsigned char c) const { return c >= lo && c <= hi; }
-};
-
-struct Token {
-    enum Kind { Star, Any, Digit, Set, Char };
-    explicit Token(Kind k, unsigned char c = 0) : kind(k), ch(c) {}
-
-    Kind kind;
-    unsigned char ch = 0;       // Char
-    bool negate = false;        // Set
-    std::vector<Range> ranges;  // Set
-
-    bool matches(unsigned char c) const {
-        switch (kind) {
-            case Any:
-                return true;
-            case Digit:
-                return c >= '0' && c <= '9';
-            case Char:
-                return Lower(c) == Lower(ch);
-            case Set: {
-                // A range holds a letter when it holds either case of it: [a-z] takes "Q".
-                bool in = false;
-                for (const Range& r : ranges)
-                    if (r.contains(c) || r.contains(Lower(c)) || r.contains(Upper(c))) {
-                        in = true;
-                        break;
-                    }
-                return in != negate;
-            }
-            case Star:
-                break;
-        }
-        return false;
-    }
-};
-
 [[noreturn]] void Invalid() {
     throw VbError(InvalidPatternString, "Invalid pattern string");
 }
 
-std::vector<Token> Compile(std::string_view p, std::optional<char> escape) {
-    std::vector<Token> tokens;
-    size_t i = 0;
-    auto literal = [&](unsigned char c) { tokens.emplace_back(Token::Char, c); };
-    while (i < p.size()) {
-        const char c = p[i++];
-        if (escape && c == *escape) {
-            if (i == p.size()) Invalid();
-            literal(static_cast<unsigned char>(p[i++]));
-            continue;
+// One element of a pattern, read in place: the pattern is matched against every row of a
+// query, so it is never copied or compiled into anything that allocates.
+struct Token {
+    enum Kind { Star, Any, Digit, Set, Char, Nothing } kind;
+    unsigned char ch = 0;               // Char
+    bool negate = false;                // Set
+    size_t listBegin = 0, listEnd = 0;  // Set: the list between the brackets
+    size_t next = 0;                    // where the following token starts
+};
+
+class Pattern {
+  public:
+    Pattern(std::string_view p, std::optional<char> escape) : p_(p), escape_(escape) {}
+
+    size_t size() const { return p_.size(); }
+
+    Token at(size_t k) const {
+        Token t{Token::Char};
+        const char c = p_[k];
+        t.next = k + 1;
+        if (isEscape(c)) {
+            if (k + 1 == p_.size()) Invalid();
+            t.ch = static_cast<unsigned char>(p_[k + 1]);
+            t.next = k + 2;
+            return t;
         }
         switch (c) {
             case '*':
-                // A run of stars is one star.
-                if (tokens.empty() || tokens.back().kind != Token::Star)
-                    tokens.emplace_back(Token::Star);
-                break;
+                t.kind = Token::Star;
+                return t;
             case '?':
-                tokens.emplace_back(Token::Any);
-                break;
+                t.kind = Token::Any;
+                return t;
             case '#':
-                tokens.emplace_back(Token::Digit);
+                t.kind = Token::Digit;
+                return t;
+            case '[':
                 break;
-            case '[': {
-                Token set(Token::Set);
-                if (i < p.size() && p[i] == '!') {
-                    set.negate = true;
-                    ++i;
-                }
-                bool closed = false;
-                bool any = false;
-                while (i < p.size()) {
-                    char item = p[i++];
-                    if (item == ']') {
-                        closed = true;
-                        break;
-                    }
-                    if (escape && item == *escape) {
-                        if (i == p.size()) Invalid();
-                        item = p[i++];
-                    }
-                    const auto lo = static_cast<unsigned char>(item);
-                    unsigned char hi = lo;
-                    // "a-z" is a range; a '-' first or last in the list is itself.
-                    if (i + 1 < p.size() && p[i] == '-' && p[i + 1] != ']') {
-                        char end = p[i + 1];
-                        i += 2;
-                        if (escape && end == *escape) {
-                            if (i == p.size()) Invalid();
-                            end = p[i++];
-                        }
-                        hi = static_cast<unsigned char>(end);
-                        if (hi < lo) Invalid();
-                    }
-                    set.ranges.push_back({lo, hi});
-                    any = true;
-                }
-                if (!closed) Invalid();
-                // [] takes no character at all; [!] is any one character.
-                if (any || set.negate) tokens.push_back(std::move(set));
-                break;
-            }
             default:
-                literal(static_cast<unsigned char>(c));
+                t.ch = static_cast<unsigned char>(c);
+                return t;
+        }
+        size_t j = k + 1;
+        if (j < p_.size() && p_[j] == '!') {
+            t.negate = true;
+            ++j;
+        }
+        t.listBegin = j;
+        for (;;) {
+            if (j >= p_.size()) Invalid();  // no closing bracket
+            if (p_[j] == ']') break;
+            j = item(j, nullptr, nullptr);
+        }
+        t.listEnd = j;
+        t.next = j + 1;
+        // [] takes no character at all; [!] is any one character.
+        t.kind = t.listBegin == t.listEnd && !t.negate ? Token::Nothing : Token::Set;
+        return t;
+    }
+
+    bool matches(const Token& t, unsigned char c) const {
+        switch (t.kind) {
+            case Token::Any:
+                return true;
+            case Token::Digit:
+                return c >= '0' && c <= '9';
+            case Token::Char:
+                return Lower(c) == Lower(t.ch);
+            case Token::Set: {
+                // A range holds a letter when it holds either case of it: [a-z] takes "Q".
+                bool in = false;
+                for (size_t j = t.listBegin; j < t.listEnd && !in;) {
+                    unsigned char lo = 0, hi = 0;
+                    j = item(j, &lo, &hi);
+                    auto holds = [&](unsigned char x) { return x >= lo && x <= hi; };
+                    in = holds(c) || holds(Lower(c)) || holds(Upper(c));
+                }
+                return in != t.negate;
+            }
+            case Token::Star:
+            case Token::Nothing:
                 break;
         }
+        return false;
     }
-    return tokens;
-}
+
+  private:
+    bool isEscape(char c) const { return escape_ && c == *escape_; }
+
+    // One item of a list at j: a character or a range "a-z"; returns where the next starts.
+    // A '-' first or last in the list is itself.
+    size_t item(size_t j, unsigned char* lo, unsigned char* hi) const {
+        auto one = [&](size_t& at) {
+            if (isEscape(p_[at])) {
+                if (at + 1 >= p_.size()) Invalid();
+                ++at;
+            }
+            return static_cast<unsigned char>(p_[at++]);
+        };
+        const unsigned char first = one(j);
+        unsigned char last = first;
+        if (j + 1 < p_.size() && p_[j] == '-' && p_[j + 1] != ']') {
+            ++j;
+            last = one(j);
+            if (last < first) Invalid();
+        }
+        if (lo) *lo = first;
+        if (hi) *hi = last;
+        return j;
+    }
+
+    std::string_view p_;
+    std::optional<char> escape_;
+};
 
 }  // namespace
 
 bool JetLike(std::string_view text, std::string_view pattern, std::optional<char> escape) {
-    const std::vector<Token> tokens = Compile(pattern, escape);
-    // Every token but the star takes exactly one character, so the classic scan that backs up
-    // to the last star is exact and linear in practice.
-    size_t t = 0, k = 0;
-    size_t starToken = SIZE_MAX, starText = 0;
-    while (t < text.size()) {
-        const auto c = static_cast<unsigned char>(text[t]);
-        if (k < tokens.size() && tokens[k].kind == Token::Star) {
-            starToken = k++;
-            starText = t;
-        } else if (k < tokens.size() && tokens[k].matches(c)) {
-            ++k;
-            ++t;
-        } else if (starToken != SIZE_MAX) {
-            k = starToken + 1;
-            t = ++starText;
-        } else {
-            return false;
-        }
+    const Pattern p(pattern, escape);
+    // A malformed pattern fails whatever the text, so read it all once first.
+    for (size_t k = 0; k < p.size(); k = p.at(k).next) {
     }
-    while (k < tokens.size() && tokens[k].kind == Token::Star) ++k;
-    return k == tokens.size();
+    // Every token but the star takes exactly one character (or none, for []), so the classic
+    // scan that backs up to the last star is exact.
+    size_t t = 0, k = 0;
+    size_t afterStar = SIZE_MAX, starText = 0;
+    while (t < text.size()) {
+        if (k < p.size()) {
+            const Token token = p.at(k);
+            if (token.kind == Token::Star) {
+                afterStar = k = token.next;
+                starText = t;
+                continue;
+            }
+            if (token.kind == Token::Nothing) {
+                k = token.next;
+                continue;
+            }
+            if (p.matches(token, static_cast<unsigned char>(text[t]))) {
+                k = token.next;
+                ++t;
+                continue;
+            }
+        }
+        if (afterStar == SIZE_MAX) return false;
+        k = afterStar;
+        t = ++starText;
+    }
+    while (k < p.size()) {
+        const Token token = p.at(k);
+        if (token.kind != Token::Star && token.kind != Token::Nothing) return false;
+        k = token.next;
+    }
+    return true;
 }
 
 }  // namespace maroset::platform

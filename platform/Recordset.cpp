@@ -45,8 +45,93 @@ void BindStored(sqlite3_stmt* s, int index, const Variant& v, uint8_t storage) {
 
 }  // namespace
 
-Recordset::Recordset(std::shared_ptr<SqliteConnection> connection, std::vector<std::string> columns)
-    : connection_(std::move(connection)), columns_(std::move(columns)) {}
+Recordset::Recordset(std::shared_ptr<SqliteConnection> connection)
+    : connection_(std::move(connection)) {}
+
+void Recordset::load(sqlite3_stmt* s, const std::string& sql) {
+    const int count = sqlite3_column_count(s);
+    // Rows can be changed when every field is a column of one table of this file, each column
+    // once (a join of a table with itself is not).
+    bool oneTable = true;
+    for (int i = 0; i < count; ++i) {
+        columns_.emplace_back(sqlite3_column_name(s, i));
+        if (!oneTable) continue;
+        const char* db = sqlite3_column_database_name(s, i);
+        const char* table = sqlite3_column_table_name(s, i);
+        const char* origin = sqlite3_column_origin_name(s, i);
+        if (!db || !table || !origin || std::string_view(db) != "main" ||
+            (i > 0 && table_ != table)) {
+            oneTable = false;
+            continue;
+        }
+        table_ = table;
+        for (const auto& seen : origins_)
+            if (NamesEqual(seen, origin)) oneTable = false;
+        origins_.emplace_back(origin);
+        // SQLite's column affinity rules, from the declared type.
+        std::string type = sqlite3_column_decltype(s, i) ? sqlite3_column_decltype(s, i) : "";
+        for (char& c : type)
+            if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 32);
+        auto has = [&](const char* part) { return type.find(part) != std::string::npos; };
+        Affinity affinity = Affinity::Numeric;
+        if (has("INT"))
+            affinity = Affinity::Numeric;
+        else if (has("CHAR") || has("CLOB") || has("TEXT"))
+            affinity = Affinity::Text;
+        else if (type.empty())
+            affinity = Affinity::None;
+        else if (has("BLOB"))
+            affinity = Affinity::Blob;
+        affinities_.push_back(affinity);
+    }
+    if (!oneTable || count == 0) {
+        table_.clear();
+        origins_.clear();
+        affinities_.clear();
+    }
+    while (connection_->Step(s, sql)) {
+        Row row;
+        for (int i = 0; i < count; ++i) {
+            row.storage.push_back(static_cast<uint8_t>(sqlite3_column_type(s, i)));
+            row.values.push_back(ReadColumn(s, i));
+        }
+        rows_.push_back(std::move(row));
+    }
+}
+
+bool Recordset::target() const {
+    if (targetKnown_) return updatable_;
+    targetKnown_ = true;
+    if (table_.empty()) return false;
+    // A table without rowids cannot be changed through a recordset.
+    sqlite3_stmt* probe = nullptr;
+    const std::string sql = "SELECT rowid FROM " + QuoteIdentifier(table_) + " LIMIT 0";
+    const bool hasRowid =
+        sqlite3_prepare_v2(connection_->handle(), sql.c_str(), -1, &probe, nullptr) == SQLITE_OK;
+    sqlite3_finalize(probe);
+    if (!hasRowid) return false;
+    // The table's INTEGER PRIMARY KEY is its rowid: a field that is that column carries it.
+    auto info = connection_->Prepare(
+        "SELECT name, type, (SELECT count(*) FROM pragma_table_info(?1) WHERE pk > 0) "
+        "FROM pragma_table_info(?1) WHERE pk = 1");
+    sqlite3_bind_text(info.get(), 1, table_.data(), static_cast<int>(table_.size()),
+                      SQLITE_TRANSIENT);
+    if (connection_->Step(info.get(), "")) {
+        const std::string name = reinterpret_cast<const char*>(sqlite3_column_text(info.get(), 0));
+        const std::string type = reinterpret_cast<const char*>(sqlite3_column_text(info.get(), 1));
+        if (sqlite3_column_int(info.get(), 2) == 1 && NamesEqual(type, "INTEGER")) {
+            rowidName_ = name;
+            for (size_t i = 0; i < origins_.size(); ++i)
+                if (NamesEqual(origins_[i], name)) rowidField_ = static_cast<int>(i);
+        }
+    }
+    updatable_ = true;
+    return true;
+}
+
+bool Recordset::Updatable() const {
+    return target();
+}
 
 Recordset::~Recordset() = default;
 
@@ -115,6 +200,12 @@ void Recordset::setField(const std::string& name, const Variant& value) {
 
 int64_t Recordset::locate(Row& row) const {
     if (row.hasRowid) return row.rowid;
+    if (rowidField_ >= 0 && row.storage[static_cast<size_t>(rowidField_)] == SQLITE_INTEGER) {
+        const Variant& key = row.values[static_cast<size_t>(rowidField_)];
+        row.rowid = key.type() == VarType::Long ? key.lng() : std::llround(key.dbl());
+        row.hasRowid = true;
+        return row.rowid;
+    }
     // The query did not select the table's key: find the row by the values it was read with.
     // Rows that are alike in every selected field are interchangeable; the first one is taken.
     std::string sql =

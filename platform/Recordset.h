@@ -7,6 +7,8 @@
 
 #include "core/Variant.h"
 
+struct sqlite3_stmt;
+
 namespace maroset::platform {
 
 class SqliteConnection;
@@ -43,8 +45,8 @@ class Recordset {
     Variant Fields(const std::string& name) const;
     // The names of the fields, in query order.
     const std::vector<std::string>& FieldNames() const { return columns_; }
-    // Whether Edit and AddNew can change the rows (a query on one table).
-    bool Updatable() const { return !table_.empty(); }
+    // Whether Edit and AddNew can change the rows (a query on one table that has rowids).
+    bool Updatable() const;
 
     // 3027 Cannot update when the rows do not come from one table.
     void AddNew();
@@ -61,7 +63,7 @@ class Recordset {
     friend class Database;
 
     // One row as read: values, the storage class of each (to find the row again exactly) and
-    // its rowid when known.
+    // its rowid once known.
     struct Row {
         std::vector<Variant> values;
         std::vector<uint8_t> storage;
@@ -70,7 +72,11 @@ class Recordset {
     };
     enum class Affinity : uint8_t { Text, Numeric, Blob, None };
 
-    Recordset(std::shared_ptr<SqliteConnection> connection, std::vector<std::string> columns);
+    explicit Recordset(std::shared_ptr<SqliteConnection> connection);
+    // Reads the field names, where each field comes from, and every row of the statement.
+    void load(sqlite3_stmt* statement, const std::string& sql);
+    // Settles, on first need only, whether and how the rows can be changed; false when not.
+    bool target() const;
 
     static constexpr size_t npos_before_ = static_cast<size_t>(-1);
     size_t column(const std::string& name) const;
@@ -83,13 +89,16 @@ class Recordset {
     std::vector<Row> rows_;
     size_t current_ = 0;
 
-    // The table the rows come from ("" when not updatable), each field's column in it and
-    // the column's affinity, and which field (if any) is the table's INTEGER PRIMARY KEY.
+    // The table the rows come from ("" when they do not come from one table), each field's
+    // column in it and the column's affinity. Which field (if any) is the table's INTEGER
+    // PRIMARY KEY is looked up on the first change.
     std::string table_;
     std::vector<std::string> origins_;
     std::vector<Affinity> affinities_;
-    std::string rowidName_ = "rowid";
-    int rowidField_ = -1;
+    mutable bool targetKnown_ = false;
+    mutable bool updatable_ = false;
+    mutable std::string rowidName_ = "rowid";
+    mutable int rowidField_ = -1;
 
     enum class Mode { None, Edit, Add } mode_ = Mode::None;
     std::vector<std::pair<size_t, Variant>> pending_;
