@@ -121,13 +121,6 @@ TEST_F(DiskTagFile, ExistingFolderIsUsedAndEachNodeHasItsOwnFile) {
     EXPECT_EQ(rows(), "");
 }
 
-TEST_F(DiskTagFile, FileIsCreatedAgainWhenDeletedBetweenStartups) {
-    started();
-    fs::remove(file());
-    started();
-    EXPECT_EQ(rows(), "");
-}
-
 TEST_F(DiskTagFile, NodeNameLeavingTheDriveRootIsRefusedAndCreatesNothing) {
     const fs::path outside = driveRoot().parent_path();
     const auto before = std::distance(fs::directory_iterator(outside), fs::directory_iterator());
@@ -149,11 +142,6 @@ TEST_F(DiskTagFile, FileThatIsNotADatabaseFailsEveryOperation) {
     started();  // an existing file is left alone, whatever it holds
     EXPECT_EQ(Bytes(file()), std::string(200, 'x'));
     EXPECT_EQ(ErrorOf([&] { driver.AddItem("Level", 5); }), err::UnrecognizedDatabase);
-}
-
-TEST_F(DiskTagFile, CreateOnAnExistingFileFails) {
-    started();
-    EXPECT_EQ(ErrorOf([&] { driver.CreateDISKIODB(); }), err::DatabaseExists);
 }
 
 // --- The tag table ----------------------------------------------------------------------------
@@ -363,20 +351,6 @@ TEST_F(DiskTagValues, NameCarryingASecondStatementIsRefusedAndNothingRuns) {
     EXPECT_EQ(ErrorOf([&] { driver.AddItem(evil, 6); }), err::CharactersAfterEnd);
     EXPECT_EQ(ErrorOf([&] { driver.WriteItem(6, 1); }), err::CharactersAfterEnd);
     EXPECT_EQ(rows(), "Level=2;");
-}
-
-TEST_F(DiskTagValues, ValuesSurviveARestart) {
-    started();
-    driver.AddItem("Level", 5);
-    driver.WriteItem(5, 12.5);
-
-    ClsDriverDiskTag restarted;
-    restarted.startup("ServerName", "Line1");
-    restarted.AddItem("Level", 11);
-    host.changes.clear();
-    restarted.ReadItem(11);
-    ASSERT_EQ(host.changes.size(), 1u);
-    EXPECT_EQ(host.changes[0].values, std::vector<Variant>{Variant("12.5")});
 }
 
 TEST_F(DiskTagValues, WriteReportedBeforeTheProcessIsKilledSurvives) {
