@@ -1,0 +1,37 @@
+#pragma once
+
+#include <cstdint>
+#include <filesystem>
+#include <string>
+
+namespace maroset {
+class nodeDB;
+}
+
+namespace maroset::cli {
+
+class EventPrinter;
+
+// One driver's part of `maroset demo`: its node in the demo project, the simulator the node
+// talks to, the tags it registers and the values it changes while the demo runs. A new driver
+// joins the demo with one more station (see Demo::Stations); give each station its own range
+// of handles (memory tags 1-9, disk tags 11-19, the next 21-29, ...).
+class DemoStation {
+  public:
+    virtual ~DemoStation() = default;
+
+    // What it shows, for the demo's first line ("memory tags").
+    virtual std::string title() const = 0;
+    // Adds its node(s) to the demo project (ProjectDatabase::AddNode).
+    virtual void addNodes(const std::filesystem::path& project) = 0;
+    // Starts the simulator its node talks to, before the project is loaded.
+    virtual void startSimulator() {}
+    // Registers its tags, and names them for readable output (EventPrinter::label).
+    virtual void addTags(nodeDB& db, EventPrinter& printer) = 0;
+    // Called at the start (second 0) and then once a second: makes values change.
+    virtual void tick(nodeDB& db, int32_t second) = 0;
+    // Stops the simulator, after the nodes are gone.
+    virtual void stopSimulator() {}
+};
+
+}  // namespace maroset::cli

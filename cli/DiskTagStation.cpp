@@ -1,0 +1,40 @@
+#include "cli/DiskTagStation.h"
+
+#include "cli/EventPrinter.h"
+#include "cli/ProjectDatabase.h"
+#include "core/VbError.h"
+#include "core/nodeDB.h"
+
+namespace maroset::cli {
+
+namespace {
+
+std::shared_ptr<node> demoNode(nodeDB& db, const char* name) {
+    auto n = db.getNode(name);
+    if (!n) throw VbError(err::ObjectNotSet);
+    return n;
+}
+
+constexpr const char* kNode = "Disk";
+}  // namespace
+
+void DiskTagStation::addNodes(const std::filesystem::path& project) {
+    ProjectDatabase::AddNode(project, {{"Name", Variant(kNode)}, {"Driver", Variant("DISKTAG")}});
+}
+
+void DiskTagStation::addTags(nodeDB& db, EventPrinter& printer) {
+    auto n = demoNode(db, kNode);
+    n->AddTag(BatchCountHandle, "BatchCount");
+    printer.label(BatchCountHandle, "Disk.BatchCount");
+}
+
+void DiskTagStation::tick(nodeDB& db, int32_t second) {
+    auto n = demoNode(db, kNode);
+    if (second == 0) {
+        n->ReadTag(BatchCountHandle);  // the stored text, "0" in a new file
+        return;
+    }
+    n->WriteTag(std::to_string(BatchCountHandle), Variant(second));
+}
+
+}  // namespace maroset::cli

@@ -1,0 +1,420 @@
+#include "cli/HostSession.h"
+
+#include <unistd.h>
+
+#include <cctype>
+#include <cerrno>
+#include <iostream>
+
+#include "cli/BadCommand.h"
+#include "cli/CommandLine.h"
+#include "cli/CommandTokenizer.h"
+#include "cli/UsageError.h"
+#include "core/ClsNodeDBInterface.h"
+#include "core/Runtime.h"
+#include "core/VbError.h"
+#include "core/nodeDB.h"
+
+namespace maroset::cli {
+
+const char* const HostSession::Usage =
+    "usage: maroset run PROJECT [--drive-root DIR] [--com N=DEVICE]... [--modbus-port P]\n"
+    "                   [--trap] [--json]\n"
+    "\n"
+    "Loads the nodes of the project database PROJECT, then reads commands from standard\n"
+    "input, one per line, and prints every value change and driver error as one line.\n"
+    "Every command is answered by one reply line, after the events it caused.\n"
+    "\n"
+    "Options:\n"
+    "  --drive-root DIR   directory that stands for drive C: (disk tags, error log)\n"
+    "  --com N=DEVICE     serial port N is DEVICE (default /dev/ttyS<N-1>); repeatable\n"
+    "  --modbus-port P    connect to couplers on TCP port P instead of 502\n"
+    "  --trap             switch error trapping on: errors are logged to\n"
+    "                     <drive root>/MarosetErrors.txt instead of reported\n"
+    "  --json             one JSON object per line\n"
+    "\n"
+    "Commands (VALUE: integer, decimal number, true/false, or text; quote text with\n"
+    "blanks in double quotes):\n"
+    "  add NODE HANDLE ADDRESS       register a tag (ADDRESS is the rest of the line)\n"
+    "  remove NODE HANDLE            unregister a tag\n"
+    "  read NODE HANDLE              read a tag; the value arrives as a value change\n"
+    "  write NODE HANDLE VALUE       write a tag\n"
+    "  writearray NODE HANDLE VALUE...  write an array (zero-based) to a tag\n"
+    "  start | stop                  start or stop scanning every node\n"
+    "  addnode NAME DRIVER [TOPIC [SCANRATE [PREFIX]]]  add a node by hand\n"
+    "  removenode NAME | removeall   remove one node or all of them\n"
+    "  nodes                         list the nodes\n"
+    "  sleep MS                      let the loop run MS ms before the next command\n"
+    "  quit                          stop scanning, remove all nodes and exit (also at end\n"
+    "                                of input)\n"
+    "Blank lines and lines starting with # are skipped.\n";
+
+const HostSession::Command HostSession::Commands[] = {
+    {"add", &HostSession::add},
+    {"remove", &HostSession::remove},
+    {"read", &HostSession::read},
+    {"write", &HostSession::write},
+    {"writearray", &HostSession::writearray},
+    {"start", &HostSession::start},
+    {"stop", &HostSession::stop},
+    {"addnode", &HostSession::addnode},
+    {"removenode", &HostSession::removenode},
+    {"removeall", &HostSession::removeall},
+    {"nodes", &HostSession::nodes},
+    {"sleep", &HostSession::sleep},
+    {"quit", &HostSession::quit},
+};
+
+namespace {
+
+std::string lowered(std::string text) {
+    for (char& c : text) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+    return text;
+}
+
+// Arguments of a command, with the reason a missing or malformed one is refused.
+std::string word(CommandTokenizer& args, const char* what) {
+    auto w = args.next();
+    if (!w) throw BadCommand(std::string("missing ") + what);
+    return w->text;
+}
+
+int32_t integer(CommandTokenizer& args, const char* what) {
+    const std::string text = word(args, what);
+    const auto value = CommandLine::ParseInteger(text);
+    if (!value) throw BadCommand(std::string(what) + " must be a whole number, not " + text);
+    return *value;
+}
+
+void noMore(CommandTokenizer& args) {
+    if (auto extra = args.next()) throw BadCommand("unexpected " + extra->text);
+}
+
+HostOptions parseOptions(const std::vector<std::string>& args, bool& help) {
+    CommandLine cl(
+        {{"drive-root", true}, {"com", true, true}, {"modbus-port", true}, {"trap"}, {"json"}});
+    cl.parse(args);
+    help = cl.help();
+    HostOptions options;
+    if (help) return options;
+    cl.requireOperands(1, 1);
+    options.project = cl.operands()[0];
+    if (auto root = cl.value("drive-root")) {
+        if (root->empty()) throw UsageError("option '--drive-root' needs a directory");
+        options.driveRoot = std::filesystem::absolute(*root);
+    }
+    for (const auto& com : cl.values("com")) {
+        const auto eq = com.find('=');
+        const auto port =
+            eq == std::string::npos ? std::nullopt : CommandLine::ParseInteger(com.substr(0, eq));
+        if (!port || *port < 1 || *port > 255 || eq + 1 >= com.size())
+            throw UsageError("option '--com' needs N=DEVICE with N from 1 to 255, not '" + com +
+                             "'");
+        options.serialPorts.emplace_back(*port, com.substr(eq + 1));
+    }
+    options.modbusPort = cl.integer("modbus-port", 1, 65535);
+    options.trap = cl.has("trap");
+    options.json = cl.has("json");
+    return options;
+}
+
+}  // namespace
+
+int HostSession::Main(const std::vector<std::string>& args) {
+    HostOptions options;
+    try {
+        bool help = false;
+        options = parseOptions(args, help);
+        if (help) {
+            std::cout << Usage;
+            return 0;
+        }
+    } catch (const UsageError& e) {
+        std::cerr << "maroset run: " << e.what() << "\n" << Usage;
+        return 2;
+    }
+    HostSession session(std::move(options), std::cout, STDIN_FILENO);
+    return session.run();
+}
+
+HostSession::HostSession(HostOptions options, std::ostream& out, int inputFd)
+    : options_(std::move(options)), printer_(out, options_.json), inputFd_(inputFd) {
+    Runtime& rt = Runtime::current();
+    if (options_.driveRoot) rt.files().setDriveRoot(*options_.driveRoot);
+    for (const auto& [port, device] : options_.serialPorts) rt.mapSerialPort(port, device);
+    if (options_.modbusPort) rt.setModbusPort(*options_.modbusPort);
+    if (options_.trap) rt.trap().setEnabled(true);
+}
+
+HostSession::~HostSession() {
+    if (inputWatch_) loop().unwatch(*inputWatch_);
+    valueChange_.reset();
+    driverError_.reset();
+    host_.reset();
+}
+
+platform::EventLoop& HostSession::loop() {
+    return Runtime::current().loop();
+}
+
+maroset::nodeDB& HostSession::db() {
+    return *host_->nodeDB();
+}
+
+bool HostSession::projectExists() const {
+    // The library takes a path with a drive letter or a backslash as a path on drive C:.
+    const std::string& name = options_.project;
+    const bool drivePath =
+        (name.size() >= 2 && name[1] == ':') || name.find('\\') != std::string::npos;
+    std::filesystem::path file = name;
+    if (drivePath) {
+        try {
+            file = Runtime::current().files().resolve(name);
+        } catch (const VbError&) {
+            return true;  // the load reports what is wrong with the path
+        }
+    }
+    std::error_code ec;
+    return std::filesystem::exists(file, ec);
+}
+
+template <class Operation>
+void HostSession::guarded(Reply& reply, Operation&& operation) {
+    try {
+        operation();
+    } catch (const BadCommand& e) {
+        reply.fail(err::InvalidProcedureCall, ErrorDescription(err::InvalidProcedureCall),
+                   e.what());
+    } catch (const VbError& e) {
+        reply.fail(e.number(), e.description());
+    } catch (const std::exception& e) {
+        // Not a run-time error of the system: shown as the language's internal error.
+        reply.fail(51, "Internal error", e.what());
+    }
+}
+
+int HostSession::run() {
+    if (!projectExists()) {
+        std::cerr << "maroset run: project database '" << options_.project << "' not found\n";
+        return 1;
+    }
+    host_ = std::make_unique<ClsNodeDBInterface>();
+    valueChange_ = host_->ValueChange.subscribe(
+        [this](VbArray<int32_t>& ids, int16_t count, VbArray<Variant>& values) {
+            printer_.valueChange(ids, count, values);
+        });
+    driverError_ = host_->DriverError.subscribe(
+        [this](const std::string& driver, const std::string& from, const std::string& message) {
+            printer_.driverError(driver, from, message);
+        });
+
+    Reply load{"load"};
+    guarded(load, [&] { db().AddAllNodes(options_.project); });
+    printer_.reply(load);
+
+    watchInput();
+    while (!done_) loop().run();
+    return 0;
+}
+
+void HostSession::watchInput() {
+    inputWatch_ =
+        loop().watch(inputFd_, platform::EventLoop::Readable, [this](short) { onInput(); });
+}
+
+void HostSession::onInput() {
+    // No more input is read until the commands in hand are done.
+    if (inputWatch_) loop().unwatch(*inputWatch_);
+    inputWatch_.reset();
+
+    char buffer[4096];
+    ssize_t n;
+    do {
+        n = ::read(inputFd_, buffer, sizeof buffer);
+    } while (n < 0 && errno == EINTR);
+    if (n > 0) {
+        partial_.append(buffer, static_cast<size_t>(n));
+        size_t start = 0;
+        for (size_t nl; (nl = partial_.find('\n', start)) != std::string::npos; start = nl + 1)
+            queue_.push_back(partial_.substr(start, nl - start));
+        partial_.erase(0, start);
+    } else if (n == 0 || (errno != EAGAIN && errno != EWOULDBLOCK)) {
+        endOfInput_ = true;
+        if (!partial_.empty()) queue_.push_back(std::exchange(partial_, {}));
+    }
+    drain();
+}
+
+void HostSession::drain() {
+    while (!done_ && !queue_.empty()) {
+        std::string line = std::move(queue_.front());
+        queue_.pop_front();
+        if (!execute(line)) return;  // a sleep: the timer goes on from here
+    }
+    if (done_) return;
+    if (endOfInput_) {
+        Reply reply{"quit"};
+        quitNow(reply);
+        printer_.reply(reply);
+        return;
+    }
+    watchInput();
+}
+
+bool HostSession::execute(const std::string& text) {
+    std::string_view line = text;
+    if (!line.empty() && line.back() == '\r') line.remove_suffix(1);
+    const size_t first = line.find_first_not_of(" \t");
+    if (first == std::string_view::npos || line[first] == '#') return true;
+
+    // The command word is the first run of non-blanks, whatever it holds.
+    line.remove_prefix(first);
+    const size_t end = std::min(line.find_first_of(" \t"), line.size());
+    const std::string name = lowered(std::string(line.substr(0, end)));
+    CommandTokenizer args(line.substr(end));
+
+    const Command* command = nullptr;
+    for (const auto& c : Commands) {
+        if (name == c.name) command = &c;
+    }
+    Reply reply{command ? name : std::string(line.substr(0, end))};
+    sleepFor_.reset();
+    guarded(reply, [&] {
+        if (!command) throw BadCommand("unknown command");
+        (this->*command->handler)(args, reply);
+    });
+    if (sleepFor_) {
+        loop().schedule(std::chrono::milliseconds(*sleepFor_), [this, reply] {
+            printer_.reply(reply);
+            drain();
+        });
+        sleepFor_.reset();
+        return false;
+    }
+    printer_.reply(reply);
+    return true;
+}
+
+void HostSession::finish() {
+    done_ = true;
+    loop().stop();
+    // Should a driver's own nested run have taken the stop, the next turn stops us.
+    loop().post([this] { loop().stop(); });
+}
+
+void HostSession::add(CommandTokenizer& args, Reply&) {
+    const std::string name = word(args, "NODE");
+    const int32_t handle = integer(args, "HANDLE");
+    const std::string address = args.rest();
+    if (address.empty()) throw BadCommand("missing ADDRESS");
+    auto n = db().getNode(name);
+    if (!n) throw VbError(err::ObjectNotSet);
+    n->AddTag(handle, address);
+}
+
+void HostSession::remove(CommandTokenizer& args, Reply&) {
+    const std::string name = word(args, "NODE");
+    const int32_t handle = integer(args, "HANDLE");
+    noMore(args);
+    auto n = db().getNode(name);
+    if (!n) throw VbError(err::ObjectNotSet);
+    n->RemoveTag(handle);
+}
+
+void HostSession::read(CommandTokenizer& args, Reply&) {
+    const std::string name = word(args, "NODE");
+    const int32_t handle = integer(args, "HANDLE");
+    noMore(args);
+    auto n = db().getNode(name);
+    if (!n) throw VbError(err::ObjectNotSet);
+    n->ReadTag(handle);
+}
+
+void HostSession::write(CommandTokenizer& args, Reply&) {
+    const std::string name = word(args, "NODE");
+    // The handle travels as the text given; the node converts it.
+    const std::string handle = word(args, "HANDLE");
+    auto value = args.next();
+    if (!value) throw BadCommand("missing VALUE");
+    noMore(args);
+    const Variant v = CommandTokenizer::ParseValue(*value);
+    auto n = db().getNode(name);
+    if (!n) throw VbError(err::ObjectNotSet);
+    n->WriteTag(handle, v);
+}
+
+void HostSession::writearray(CommandTokenizer& args, Reply&) {
+    const std::string name = word(args, "NODE");
+    const std::string handle = word(args, "HANDLE");
+    std::vector<Variant> items;
+    while (auto value = args.next()) items.push_back(CommandTokenizer::ParseValue(*value));
+    if (items.empty()) throw BadCommand("missing VALUE");
+    VbArray<Variant> values(0, std::move(items));
+    auto n = db().getNode(name);
+    if (!n) throw VbError(err::ObjectNotSet);
+    n->WriteArray(handle, values);
+}
+
+void HostSession::start(CommandTokenizer& args, Reply&) {
+    noMore(args);
+    db().StartScanning();
+}
+
+void HostSession::stop(CommandTokenizer& args, Reply&) {
+    noMore(args);
+    db().StopScanning();
+}
+
+void HostSession::addnode(CommandTokenizer& args, Reply&) {
+    const std::string name = word(args, "NAME");
+    const std::string driver = word(args, "DRIVER");
+    std::string topic;
+    int32_t scanRate = 0;
+    int32_t prefix = 0;
+    if (auto t = args.next()) {
+        topic = t->text;
+        if (!args.atEnd()) scanRate = integer(args, "SCANRATE");
+        if (!args.atEnd()) prefix = integer(args, "PREFIX");
+    }
+    noMore(args);
+    db().AddNode(name, driver, topic, scanRate, prefix);
+}
+
+void HostSession::removenode(CommandTokenizer& args, Reply&) {
+    const std::string name = word(args, "NAME");
+    noMore(args);
+    db().RemoveNode(name);
+}
+
+void HostSession::removeall(CommandTokenizer& args, Reply&) {
+    noMore(args);
+    db().RemoveAllNodes();
+}
+
+void HostSession::nodes(CommandTokenizer& args, Reply& reply) {
+    noMore(args);
+    std::vector<Reply::NodeEntry> list;
+    for (const auto& n : db().nodes()) list.push_back({n->Name, n->DriverName});
+    reply.nodes = std::move(list);
+}
+
+void HostSession::sleep(CommandTokenizer& args, Reply&) {
+    const int32_t ms = integer(args, "MS");
+    if (ms < 0) throw BadCommand("MS must not be negative");
+    noMore(args);
+    sleepFor_ = ms;
+}
+
+void HostSession::quit(CommandTokenizer& args, Reply& reply) {
+    noMore(args);
+    quitNow(reply);
+}
+
+void HostSession::quitNow(Reply& reply) {
+    // Both steps run even when the first fails; the first error is the one reported.
+    guarded(reply, [&] { db().StopScanning(); });
+    guarded(reply, [&] { db().RemoveAllNodes(); });
+    finish();
+}
+
+}  // namespace maroset::cli

@@ -1,0 +1,159 @@
+#include "cli/JsonWriter.h"
+
+#include <cmath>
+
+#include "core/Conversions.h"
+#include "core/Object.h"
+
+namespace maroset::cli {
+
+void JsonWriter::separate() {
+    if (afterKey_) {
+        afterKey_ = false;
+        return;
+    }
+    if (!first_.empty()) {
+        if (!first_.back()) out_ += ',';
+        first_.back() = false;
+    }
+}
+
+JsonWriter& JsonWriter::beginObject() {
+    separate();
+    out_ += '{';
+    first_.push_back(true);
+    return *this;
+}
+
+JsonWriter& JsonWriter::endObject() {
+    out_ += '}';
+    first_.pop_back();
+    return *this;
+}
+
+JsonWriter& JsonWriter::beginArray() {
+    separate();
+    out_ += '[';
+    first_.push_back(true);
+    return *this;
+}
+
+JsonWriter& JsonWriter::endArray() {
+    out_ += ']';
+    first_.pop_back();
+    return *this;
+}
+
+JsonWriter& JsonWriter::key(std::string_view name) {
+    separate();
+    out_ += Quote(name);
+    out_ += ':';
+    afterKey_ = true;
+    return *this;
+}
+
+JsonWriter& JsonWriter::string(std::string_view bytes) {
+    separate();
+    out_ += Quote(bytes);
+    return *this;
+}
+
+JsonWriter& JsonWriter::integer(int64_t value) {
+    separate();
+    out_ += std::to_string(value);
+    return *this;
+}
+
+JsonWriter& JsonWriter::boolean(bool value) {
+    separate();
+    out_ += value ? "true" : "false";
+    return *this;
+}
+
+JsonWriter& JsonWriter::null() {
+    separate();
+    out_ += "null";
+    return *this;
+}
+
+JsonWriter& JsonWriter::value(const Variant& v) {
+    switch (v.type()) {
+        case VarType::Empty:
+        case VarType::Null:
+            return null();
+        case VarType::Boolean:
+            return boolean(v.boolean());
+        case VarType::String:
+            return string(v.string());
+        case VarType::Integer:
+        case VarType::Long:
+        case VarType::Single:
+        case VarType::Double:
+            separate();
+            out_ += Number(v);
+            return *this;
+        case VarType::Array:
+            beginArray();
+            for (const Variant& item : v.array()) value(item);
+            return endArray();
+        case VarType::Object:
+            if (const auto& object = v.object()) return value(object->defaultValue());
+            return null();
+    }
+    return null();
+}
+
+std::string JsonWriter::Quote(std::string_view bytes) {
+    static constexpr char hex[] = "0123456789abcdef";
+    std::string out;
+    out.reserve(bytes.size() + 2);
+    out += '"';
+    for (const char c : bytes) {
+        const auto b = static_cast<unsigned char>(c);
+        switch (b) {
+            case '"':
+                out += "\\\"";
+                continue;
+            case '\\':
+                out += "\\\\";
+                continue;
+            case '\n':
+                out += "\\n";
+                continue;
+            case '\r':
+                out += "\\r";
+                continue;
+            case '\t':
+                out += "\\t";
+                continue;
+            case '\b':
+                out += "\\b";
+                continue;
+            case '\f':
+                out += "\\f";
+                continue;
+            default:
+                break;
+        }
+        if (b < 0x20 || b >= 0x7F) {
+            out += "\\u00";
+            out += hex[b >> 4];
+            out += hex[b & 0xF];
+        } else {
+            out += c;
+        }
+    }
+    out += '"';
+    return out;
+}
+
+std::string JsonWriter::Number(const Variant& number) {
+    if (!std::isfinite(CDbl(number))) return "null";
+    std::string text = CStr(number);
+    // JSON wants a digit before the point; CStr writes one, but a bare ".5" must never slip out.
+    if (text.rfind(".", 0) == 0) text.insert(0, "0");
+    if (text.rfind("-.", 0) == 0) text.insert(1, "0");
+    return text;
+}
+
+}  // namespace maroset::cli

@@ -1,0 +1,37 @@
+// The `maroset` command: a host for the library that scripts and newcomers use.
+#include <iostream>
+#include <string>
+#include <vector>
+
+#include "cli/Demo.h"
+#include "cli/HostSession.h"
+#include "cli/ProjectCommands.h"
+
+namespace {
+
+constexpr const char* kUsage =
+    "usage: maroset run PROJECT [options]      serve commands on a project (see run --help)\n"
+    "       maroset project init|add|list ...  create and edit a project database\n"
+    "       maroset demo [--seconds N] [--json]  watch a small project live\n"
+    "       maroset COMMAND --help             help on one command\n";
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    std::vector<std::string> args(argv + 1, argv + argc);
+    if (args.empty()) {
+        std::cerr << kUsage;
+        return 2;
+    }
+    const std::string command = args[0];
+    args.erase(args.begin());
+    if (command == "--help" || command == "-h" || command == "help") {
+        std::cout << kUsage;
+        return 0;
+    }
+    if (command == "run") return maroset::cli::HostSession::Main(args);
+    if (command == "project") return maroset::cli::ProjectCommands::Main(args);
+    if (command == "demo") return maroset::cli::Demo::Main(args);
+    std::cerr << "maroset: unknown command '" << command << "'\n" << kUsage;
+    return 2;
+}
