@@ -129,7 +129,6 @@ void Demo::runProject(const std::filesystem::path& root) {
         });
     nodeDB& db = *host.nodeDB();
     platform::EventLoop& loop = rt.loop();
-    const auto started = loop.now();
 
     // Nodes, simulators and scanning are undone whatever happens on the way.
     struct Teardown {
@@ -166,6 +165,7 @@ void Demo::runProject(const std::filesystem::path& root) {
     ticker.Interval(1000);
     ticker.Enabled(true);
     StopSignal interrupt(loop, [&] { loop.stop(); });
+    const auto started = loop.now();
     loop.runFor(std::chrono::seconds(seconds_));
     ticker.Enabled(false);
     if (failed) throw *failed;
