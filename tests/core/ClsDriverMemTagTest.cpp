@@ -2,11 +2,14 @@
 
 #include <gtest/gtest.h>
 
+#include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
 namespace {
+
+using test::errorOf;
 
 class MemTagTest : public test::RuntimeFixture {
   protected:
@@ -75,12 +78,7 @@ TEST(DriverContract, MissingMembersFailAsACallByNameWould) {
              [&] { d.shutdown(); }, [&] { d.startup("a", "b"); }, [&] { d.PostMessage(code); },
              [&] { d.IsActive(true); }, [&] { d.WriteItem(1, 1); }, [&] { d.AddItem("a", 1); },
              [&] { d.ReadItem(1); }, [&] { d.WriteArray(1, data); }}) {
-        try {
-            call();
-            FAIL();
-        } catch (const VbError& e) {
-            EXPECT_EQ(e.number(), err::NotSupported);
-        }
+        EXPECT_EQ(errorOf([&] { call(); }), err::NotSupported);
     }
 }
 

@@ -6,11 +6,14 @@
 #include <string>
 
 #include "core/Runtime.h"
+#include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
 namespace {
+
+using test::errorOf;
 
 class NodeTest : public test::RuntimeFixture {
   protected:
@@ -36,12 +39,7 @@ TEST_F(NodeTest, TypeKeySelectsDriverInAnyCaseAndFallsBackToMemoryTags) {
 
 TEST_F(NodeTest, NullTypeKeyFailsInit) {
     auto n = makeNode(Variant::Null());
-    try {
-        n->Init();
-        FAIL();
-    } catch (const VbError& e) {
-        EXPECT_EQ(e.number(), err::InvalidUseOfNull);
-    }
+    EXPECT_EQ(errorOf([&] { n->Init(); }), err::InvalidUseOfNull);
     EXPECT_FALSE(n->driver());
 }
 
@@ -76,18 +74,8 @@ TEST_F(NodeTest, HandleOutsideSixteenBitsOverflowsInAddAndRemove) {
     EXPECT_NO_THROW(n->AddTag(32767, "A"));
     EXPECT_NO_THROW(n->AddTag(-32768, "A"));
     for (int32_t handle : {32768, -32769, 100000}) {
-        try {
-            n->AddTag(handle, "A");
-            FAIL() << handle;
-        } catch (const VbError& e) {
-            EXPECT_EQ(e.number(), err::Overflow);
-        }
-        try {
-            n->RemoveTag(handle);
-            FAIL() << handle;
-        } catch (const VbError& e) {
-            EXPECT_EQ(e.number(), err::Overflow);
-        }
+        EXPECT_EQ(errorOf([&] { n->AddTag(handle, "A"); }), err::Overflow);
+        EXPECT_EQ(errorOf([&] { n->RemoveTag(handle); }), err::Overflow);
     }
     // Reads and writes carry 32 bits.
     n->WriteTag("100000", 1);
@@ -125,12 +113,7 @@ TEST_F(NodeTest, OperationsBeforeInitFailWithObjectNotSet) {
         [&] { n->WriteArray("1", values); },
     };
     for (const auto& op : ops) {
-        try {
-            op();
-            FAIL();
-        } catch (const VbError& e) {
-            EXPECT_EQ(e.number(), err::ObjectNotSet);
-        }
+        EXPECT_EQ(errorOf([&] { op(); }), err::ObjectNotSet);
     }
 }
 

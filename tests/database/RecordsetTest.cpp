@@ -8,6 +8,7 @@
 
 #include "core/VbError.h"
 #include "platform/Database.h"
+#include "support/ErrorOf.h"
 #include "support/TempDir.h"
 
 namespace maroset::platform {
@@ -15,14 +16,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
-int32_t ErrorOf(const std::function<void()>& call) {
-    try {
-        call();
-    } catch (const VbError& e) {
-        return e.number();
-    }
-    return 0;
-}
+using test::errorOf;
 
 class RecordsetFixture : public ::testing::Test {
   protected:
@@ -66,9 +60,9 @@ TEST_F(RecordsetCursor, WalksEveryRowThenReportsEndOfFile) {
         rs->MoveNext();
     }
     EXPECT_EQ(names, "Line1;Line1;Line2;");
-    EXPECT_EQ(ErrorOf([&] { rs->MoveNext(); }), err::NoCurrentRecord);
-    EXPECT_EQ(ErrorOf([&] { rs->Fields("Name"); }), err::NoCurrentRecord);
-    EXPECT_EQ(ErrorOf([&] { rs->Edit(); }), err::NoCurrentRecord);
+    EXPECT_EQ(errorOf([&] { rs->MoveNext(); }), err::NoCurrentRecord);
+    EXPECT_EQ(errorOf([&] { rs->Fields("Name"); }), err::NoCurrentRecord);
+    EXPECT_EQ(errorOf([&] { rs->Edit(); }), err::NoCurrentRecord);
 }
 
 TEST_F(RecordsetCursor, EmptyRecordsetHasNoCurrentRecord) {
@@ -77,15 +71,15 @@ TEST_F(RecordsetCursor, EmptyRecordsetHasNoCurrentRecord) {
     EXPECT_EQ(rs->RecordCount(), 0);
     EXPECT_TRUE(rs->eof());
     EXPECT_TRUE(rs->bof());
-    EXPECT_EQ(ErrorOf([&] { rs->MoveFirst(); }), err::NoCurrentRecord);
-    EXPECT_EQ(ErrorOf([&] { rs->Fields("TagValue"); }), err::NoCurrentRecord);
+    EXPECT_EQ(errorOf([&] { rs->MoveFirst(); }), err::NoCurrentRecord);
+    EXPECT_EQ(errorOf([&] { rs->Fields("TagValue"); }), err::NoCurrentRecord);
 }
 
 TEST_F(RecordsetCursor, UnknownFieldIsItemNotFound) {
     auto rs = Database::Open(file())->OpenRecordset("select * from Nodes ");
-    EXPECT_EQ(ErrorOf([&] { rs->Fields("OPCServer"); }), err::ItemNotFound);
+    EXPECT_EQ(errorOf([&] { rs->Fields("OPCServer"); }), err::ItemNotFound);
     rs->Edit();
-    EXPECT_EQ(ErrorOf([&] { rs->setField("OPCServer", Variant("x")); }), err::ItemNotFound);
+    EXPECT_EQ(errorOf([&] { rs->setField("OPCServer", Variant("x")); }), err::ItemNotFound);
 }
 
 TEST_F(RecordsetCursor, NumbersAndNullsComeAsStored) {
@@ -176,30 +170,30 @@ TEST_F(RecordsetUpdates, UpdateOfARowDeletedMeanwhileFails) {
     Database::Open(file())->Execute("DELETE FROM TagValues WHERE TagName = 'Level'");
     rs->Edit();
     rs->setField("TagValue", Variant("9"));
-    EXPECT_EQ(ErrorOf([&] { rs->Update(); }), 3167);
+    EXPECT_EQ(errorOf([&] { rs->Update(); }), 3167);
 }
 
 TEST_F(RecordsetUpdates, UpdateWithoutEditOrAddNewFails) {
     auto rs = Database::Open(file())->OpenRecordset("select * from TagValues");
     rs->MoveFirst();
-    EXPECT_EQ(ErrorOf([&] { rs->Update(); }), 3020);
-    EXPECT_EQ(ErrorOf([&] { rs->setField("TagValue", Variant("1")); }), 3020);
+    EXPECT_EQ(errorOf([&] { rs->Update(); }), 3020);
+    EXPECT_EQ(errorOf([&] { rs->setField("TagValue", Variant("1")); }), 3020);
     rs->Edit();
     rs->setField("TagValue", Variant("1"));
     rs->MoveNext();  // leaving the record drops the edit
-    EXPECT_EQ(ErrorOf([&] { rs->Update(); }), 3020);
+    EXPECT_EQ(errorOf([&] { rs->Update(); }), 3020);
 }
 
 TEST_F(RecordsetUpdates, QueriesNotOnOneTableAreReadOnly) {
     auto db = Database::Open(file());
     auto rs = db->OpenRecordset("select count(*) AS n from TagValues");
     EXPECT_FALSE(rs->Updatable());
-    EXPECT_EQ(ErrorOf([&] { rs->AddNew(); }), 3027);
+    EXPECT_EQ(errorOf([&] { rs->AddNew(); }), 3027);
     auto joined =
         db->OpenRecordset("select a.TagName, b.TagName AS Other from TagValues a, TagValues b");
     EXPECT_FALSE(joined->Updatable());
     joined->MoveFirst();
-    EXPECT_EQ(ErrorOf([&] { joined->Edit(); }), 3027);
+    EXPECT_EQ(errorOf([&] { joined->Edit(); }), 3027);
 }
 
 }  // namespace

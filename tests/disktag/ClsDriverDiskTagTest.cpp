@@ -14,6 +14,7 @@
 
 #include "core/Runtime.h"
 #include "core/node.h"
+#include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
 #include "support/RuntimeFixture.h"
 #include "support/SqlScript.h"
@@ -23,14 +24,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
-int32_t ErrorOf(const std::function<void()>& call) {
-    try {
-        call();
-    } catch (const VbError& e) {
-        return e.number();
-    }
-    return 0;
-}
+using test::errorOf;
 
 // Reads a tag file with SQLite itself: rows as "name=value" joined by ";" in ID order.
 std::string RowsOf(
@@ -124,15 +118,15 @@ TEST_F(DiskTagFile, ExistingFolderIsUsedAndEachNodeHasItsOwnFile) {
 TEST_F(DiskTagFile, NodeNameLeavingTheDriveRootIsRefusedAndCreatesNothing) {
     const fs::path outside = driveRoot().parent_path();
     const auto before = std::distance(fs::directory_iterator(outside), fs::directory_iterator());
-    EXPECT_EQ(ErrorOf([&] { driver.startup("ServerName", "..\\..\\Escaped"); }),
+    EXPECT_EQ(errorOf([&] { driver.startup("ServerName", "..\\..\\Escaped"); }),
               err::PathFileAccess);
-    EXPECT_EQ(ErrorOf([&] { driver.startup("ServerName", "../../Escaped"); }), err::PathFileAccess);
-    EXPECT_EQ(ErrorOf([&] { driver.startup("ServerName", std::string("Line1\0/../../x", 15)); }),
+    EXPECT_EQ(errorOf([&] { driver.startup("ServerName", "../../Escaped"); }), err::PathFileAccess);
+    EXPECT_EQ(errorOf([&] { driver.startup("ServerName", std::string("Line1\0/../../x", 15)); }),
               err::PathFileAccess);
     EXPECT_FALSE(fs::exists(outside / "Escaped.mdb"));
     EXPECT_EQ(std::distance(fs::directory_iterator(outside), fs::directory_iterator()), before);
     // The operations that open the file refuse the path as well.
-    EXPECT_EQ(ErrorOf([&] { driver.AddItem("Level", 5); }), err::PathFileAccess);
+    EXPECT_EQ(errorOf([&] { driver.AddItem("Level", 5); }), err::PathFileAccess);
     EXPECT_FALSE(fs::exists(outside / "Escaped.mdb"));
 }
 
@@ -141,7 +135,7 @@ TEST_F(DiskTagFile, FileThatIsNotADatabaseFailsEveryOperation) {
     std::ofstream(file()) << std::string(200, 'x');
     started();  // an existing file is left alone, whatever it holds
     EXPECT_EQ(Bytes(file()), std::string(200, 'x'));
-    EXPECT_EQ(ErrorOf([&] { driver.AddItem("Level", 5); }), err::UnrecognizedDatabase);
+    EXPECT_EQ(errorOf([&] { driver.AddItem("Level", 5); }), err::UnrecognizedDatabase);
 }
 
 // --- The tag table ----------------------------------------------------------------------------
@@ -178,8 +172,8 @@ TEST_F(DiskTagTable, RepeatedHandleFindsTheFirstSlot) {
 TEST_F(DiskTagTable, UnknownHandleFailsWithSubscriptOutOfRange) {
     started();
     driver.AddItem("Level", 5);
-    EXPECT_EQ(ErrorOf([&] { driver.ReadItem(6); }), err::SubscriptOutOfRange);
-    EXPECT_EQ(ErrorOf([&] { driver.WriteItem(6, 1); }), err::SubscriptOutOfRange);
+    EXPECT_EQ(errorOf([&] { driver.ReadItem(6); }), err::SubscriptOutOfRange);
+    EXPECT_EQ(errorOf([&] { driver.WriteItem(6, 1); }), err::SubscriptOutOfRange);
     EXPECT_EQ(rows(), "Level=0;");
     EXPECT_TRUE(host.changes.empty());
 }
@@ -189,7 +183,7 @@ TEST_F(DiskTagTable, HandleZeroFindsTheEmptySlotAndItsEmptyName) {
     driver.AddItem("Level", 5);
     // The empty name has no row: a read reports nothing, a write has no current record.
     EXPECT_EQ(driver.ReadItem(0), 0);
-    EXPECT_EQ(ErrorOf([&] { driver.WriteItem(0, 1); }), err::NoCurrentRecord);
+    EXPECT_EQ(errorOf([&] { driver.WriteItem(0, 1); }), err::NoCurrentRecord);
     // A row with an empty name is what handle 0 reaches.
     test::RunSqlScript(file(), "INSERT INTO TagValues (TagName, TagValue) VALUES ('', 'e');");
     driver.ReadItem(0);
@@ -207,8 +201,8 @@ TEST_F(DiskTagTable, RemovedTagStaysRegistered) {
 }
 
 TEST_F(DiskTagTable, AddBeforeStartupFailsWithSubscriptOutOfRange) {
-    EXPECT_EQ(ErrorOf([&] { driver.AddItem("Level", 5); }), err::SubscriptOutOfRange);
-    EXPECT_EQ(ErrorOf([&] { driver.ReadItem(5); }), err::SubscriptOutOfRange);
+    EXPECT_EQ(errorOf([&] { driver.AddItem("Level", 5); }), err::SubscriptOutOfRange);
+    EXPECT_EQ(errorOf([&] { driver.ReadItem(5); }), err::SubscriptOutOfRange);
     EXPECT_FALSE(fs::exists(folder()));
 }
 
@@ -217,7 +211,7 @@ TEST_F(DiskTagTable, StartupEmptiesTheTable) {
     driver.AddItem("Level", 5);
     started();
     EXPECT_EQ(driver.TagNames().items(), (std::vector<std::string>{"", ""}));
-    EXPECT_EQ(ErrorOf([&] { driver.ReadItem(5); }), err::SubscriptOutOfRange);
+    EXPECT_EQ(errorOf([&] { driver.ReadItem(5); }), err::SubscriptOutOfRange);
 }
 
 // --- Values -----------------------------------------------------------------------------------
@@ -301,7 +295,7 @@ TEST_F(DiskTagValues, WriteToAMissingRowFailsWithNoCurrentRecordAndReportsNothin
     started();
     driver.AddItem("Level", 5);
     test::RunSqlScript(file(), "DELETE FROM TagValues;");
-    EXPECT_EQ(ErrorOf([&] { driver.WriteItem(5, 1); }), err::NoCurrentRecord);
+    EXPECT_EQ(errorOf([&] { driver.WriteItem(5, 1); }), err::NoCurrentRecord);
     EXPECT_TRUE(host.changes.empty());
     EXPECT_EQ(rows(), "");
     driver.ReadItem(5);
@@ -337,10 +331,10 @@ TEST_F(DiskTagValues, SqlWildcardsAreOrdinaryCharacters) {
 
 TEST_F(DiskTagValues, QuoteInANameFailsTheQueryAfterRegistering) {
     started();
-    EXPECT_EQ(ErrorOf([&] { driver.AddItem("O'Brien", 5); }), err::QuerySyntax);
+    EXPECT_EQ(errorOf([&] { driver.AddItem("O'Brien", 5); }), err::QuerySyntax);
     EXPECT_EQ(driver.TagNames().items(), (std::vector<std::string>{"", "O'Brien", ""}));
     EXPECT_EQ(rows(), "");
-    EXPECT_EQ(ErrorOf([&] { driver.ReadItem(5); }), err::QuerySyntax);
+    EXPECT_EQ(errorOf([&] { driver.ReadItem(5); }), err::QuerySyntax);
 }
 
 TEST_F(DiskTagValues, NameCarryingASecondStatementIsRefusedAndNothingRuns) {
@@ -348,8 +342,8 @@ TEST_F(DiskTagValues, NameCarryingASecondStatementIsRefusedAndNothingRuns) {
     driver.AddItem("Level", 5);
     driver.WriteItem(5, 2);
     const std::string evil = "x'; DELETE FROM TagValues; UPDATE TagValues SET TagValue='9";
-    EXPECT_EQ(ErrorOf([&] { driver.AddItem(evil, 6); }), err::CharactersAfterEnd);
-    EXPECT_EQ(ErrorOf([&] { driver.WriteItem(6, 1); }), err::CharactersAfterEnd);
+    EXPECT_EQ(errorOf([&] { driver.AddItem(evil, 6); }), err::CharactersAfterEnd);
+    EXPECT_EQ(errorOf([&] { driver.WriteItem(6, 1); }), err::CharactersAfterEnd);
     EXPECT_EQ(rows(), "Level=2;");
 }
 
@@ -382,14 +376,6 @@ TEST_F(DiskTagValues, WriteReportedBeforeTheProcessIsKilledSurvives) {
 class DiskTagTrapped : public DiskTagFixture {
   protected:
     void SetUp() override { runtime().trap().setEnabled(true); }
-    int records() const {
-        const std::string log = readDriveFile("MarosetErrors.txt");
-        int n = 0;
-        for (size_t at = log.find("Date: "); at != std::string::npos;
-             at = log.find("Date: ", at + 1))
-            ++n;
-        return n;
-    }
 };
 
 TEST_F(DiskTagTrapped, FailingStatementIsLoggedRetriedThenSkipped) {
@@ -397,7 +383,7 @@ TEST_F(DiskTagTrapped, FailingStatementIsLoggedRetriedThenSkipped) {
     driver.AddItem("Level", 5);
     EXPECT_NO_THROW(driver.ReadItem(6));
     const std::string log = readDriveFile("MarosetErrors.txt");
-    EXPECT_EQ(records(), 6) << log;
+    EXPECT_EQ(errorLogRecords(), 6u) << log;
     EXPECT_NE(log.find("Module\\Sub: ClsDriverDiskTag.ReadItem 0\r\n"), std::string::npos) << log;
     EXPECT_NE(log.find("Error #9 was generated by "), std::string::npos) << log;
     EXPECT_TRUE(host.changes.empty());

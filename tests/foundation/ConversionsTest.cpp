@@ -5,19 +5,12 @@
 #include <cmath>
 #include <functional>
 #include <limits>
+#include "support/ErrorOf.h"
 
 namespace maroset {
 namespace {
 
-template <class F>
-int32_t errorOf(F&& f) {
-    try {
-        f();
-    } catch (const VbError& e) {
-        return e.number();
-    }
-    return 0;
-}
+using test::errorOf;
 
 const Variant kNull = Variant::Null();
 const Variant kArray = Variant(VbArray<Variant>(0, 0));

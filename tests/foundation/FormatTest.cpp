@@ -3,19 +3,12 @@
 #include <gtest/gtest.h>
 
 #include <limits>
+#include "support/ErrorOf.h"
 
 namespace maroset {
 namespace {
 
-template <class F>
-int32_t errorOf(F&& f) {
-    try {
-        f();
-    } catch (const VbError& e) {
-        return e.number();
-    }
-    return 0;
-}
+using test::errorOf;
 
 TEST(FormatZeroPadded, AtLeastThreeDigits) {
     EXPECT_EQ(Format(int32_t{5}, "000"), "005");

@@ -9,22 +9,16 @@
 #include <string>
 
 #include "core/VbError.h"
+#include "support/ErrorOf.h"
 #include "support/TempDir.h"
 
 namespace maroset::platform {
 namespace {
 
+using test::errorOf;
+
 namespace fs = std::filesystem;
 using namespace std::string_literals;
-
-int32_t errorOf(const std::function<void()>& f) {
-    try {
-        f();
-    } catch (const VbError& e) {
-        return e.number();
-    }
-    return 0;
-}
 
 std::string readAll(const fs::path& p) {
     std::ifstream in(p, std::ios::binary);

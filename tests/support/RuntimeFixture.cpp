@@ -33,4 +33,12 @@ std::string RuntimeFixture::readDriveFile(const std::string& relative) const {
     return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
 }
 
+size_t RuntimeFixture::errorLogRecords() const {
+    const std::string log = readDriveFile("MarosetErrors.txt");
+    size_t n = 0;
+    for (size_t at = log.find("Date: "); at != std::string::npos; at = log.find("Date: ", at + 1))
+        ++n;
+    return n;
+}
+
 }  // namespace maroset::test

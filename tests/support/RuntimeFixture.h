@@ -27,6 +27,8 @@ class RuntimeFixture : public ::testing::Test {
     void advance(std::chrono::milliseconds d) { loop_->advance(d); }
     // Reads a file under the drive root ("" when it does not exist).
     std::string readDriveFile(const std::string& relative) const;
+    // Number of records in the error log, C:\MarosetErrors.txt.
+    size_t errorLogRecords() const;
 
     std::vector<std::string> messageBoxes;
 
