@@ -1,4 +1,8 @@
 // The `maroset` command: a host for the library that scripts and newcomers use.
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
 #include <iostream>
 #include <string>
 #include <vector>
@@ -15,9 +19,21 @@ constexpr const char* kUsage =
     "       maroset demo [--seconds N] [--json]  watch a small project live\n"
     "       maroset COMMAND --help             help on one command\n";
 
+// A standard descriptor the caller closed would be taken by the next file opened (a project
+// database read as commands, say): park /dev/null on it first.
+void keepStandardDescriptors() {
+    for (int fd = 0; fd <= 2; ++fd) {
+        if (fcntl(fd, F_GETFD) == -1 && errno == EBADF) {
+            const int opened = open("/dev/null", fd == 0 ? O_RDONLY : O_WRONLY);
+            if (opened != fd && opened >= 0) close(opened);  // cannot happen: lowest free fd
+        }
+    }
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
+    keepStandardDescriptors();
     std::vector<std::string> args(argv + 1, argv + argc);
     if (args.empty()) {
         std::cerr << kUsage;
