@@ -2,11 +2,13 @@
 
 #include <cstdint>
 #include <filesystem>
+#include <memory>
 #include <string>
 
 namespace maroset {
+class node;
 class nodeDB;
-}
+}  // namespace maroset
 
 namespace maroset::cli {
 
@@ -32,6 +34,10 @@ class DemoStation {
     virtual void tick(nodeDB& db, int32_t second) = 0;
     // Stops the simulator, after the nodes are gone.
     virtual void stopSimulator() {}
+
+  protected:
+    // The station's node in the loaded project (Object variable not set if it is missing).
+    static std::shared_ptr<node> demoNode(nodeDB& db, const char* name);
 };
 
 }  // namespace maroset::cli

@@ -2,18 +2,11 @@
 
 #include "cli/EventPrinter.h"
 #include "cli/ProjectDatabase.h"
-#include "core/VbError.h"
 #include "core/nodeDB.h"
 
 namespace maroset::cli {
 
 namespace {
-
-std::shared_ptr<node> demoNode(nodeDB& db, const char* name) {
-    auto n = db.getNode(name);
-    if (!n) throw VbError(err::ObjectNotSet);
-    return n;
-}
 
 constexpr const char* kNode = "Disk";
 }  // namespace

@@ -17,7 +17,7 @@ namespace maroset {
 //     host.nodeDB()->getNode("Line1")->AddTag(7, "N7:0");
 //     host.nodeDB()->StartScanning();
 class ClsNodeDBInterface {
-public:
+  public:
     // Class_Initialize: attaches to the process-wide nodeDB, creating it on first use.
     ClsNodeDBInterface();
     ~ClsNodeDBInterface();
@@ -31,9 +31,8 @@ public:
     ValueChangeEvent ValueChange;
     DriverErrorEvent DriverError;
 
-private:
-    void nodeDB_valuechange(VbArray<int32_t>& TagIDs, int16_t NumItems,
-                            VbArray<Variant>& Values);
+  private:
+    void nodeDB_valuechange(VbArray<int32_t>& TagIDs, int16_t NumItems, VbArray<Variant>& Values);
     void nodeDB_DriverError(const std::string& Driver, const std::string& FromSub,
                             const std::string& Message);
 

@@ -3,8 +3,8 @@
 #include <cstdint>
 #include <string>
 
-#include "core/VbArray.h"
 #include "core/Variant.h"
+#include "core/VbArray.h"
 
 namespace maroset {
 
@@ -19,7 +19,7 @@ namespace maroset {
 // their node. Every operation runs under the driver's own error trap, with the driver's class
 // name as module name.
 class Driver {
-public:
+  public:
     virtual ~Driver() = default;
 
     // The driver's class name ("ClsDriverMemTag", ...), its module name in the error log.
@@ -60,11 +60,11 @@ public:
     virtual int32_t ReadAllItems();
     virtual int32_t WriteArray(int32_t ClientHandle, VbArray<Variant>& data);
 
-protected:
+  protected:
     // Fails as a call of a member the driver lacks does.
     [[noreturn]] static void missing();
 
-private:
+  private:
     Variant scanRate_;
     std::string nodeName_;
     Variant opcTopic_;

@@ -19,7 +19,7 @@ namespace maroset {
 // on, every error also shows "Errorcount Exceeded Please call tech support" in a modal
 // message box.
 class ErrorTrap {
-public:
+  public:
     using MessageBox = std::function<void(const std::string& text)>;
 
     ErrorTrap(const platform::Clock& clock, const platform::FileSystem& files,
@@ -33,15 +33,14 @@ public:
                         const VbError& pending);
     // Appends one record to the log; a failure to write is ignored.
     void WriteErrorLog(const std::string& Message, const std::string& Description,
-                       const std::string& Heading, const std::string& Location,
-                       int32_t LineNumber);
+                       const std::string& Heading, const std::string& Location, int32_t LineNumber);
 
     int32_t burstCount() const { return burst_; }
     int32_t longBurstCount() const { return longBurst_; }
 
     static constexpr const char* LogPath = "C:\\MarosetErrors.txt";
 
-private:
+  private:
     const platform::Clock& clock_;
     const platform::FileSystem& files_;
     MessageBox messageBox_;

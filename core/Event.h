@@ -20,7 +20,7 @@ namespace maroset {
 // Errors thrown by a handler propagate to the raiser; the remaining handlers are not called.
 template <class... Args>
 class Event {
-public:
+  public:
     using Handler = std::function<void(Args...)>;
 
     Event() = default;
@@ -51,7 +51,7 @@ public:
                                                  [](const auto& s) { return s->live; }));
     }
 
-private:
+  private:
     struct Slot {
         Handler handler;
         bool live;

@@ -7,7 +7,7 @@ class Variant;
 // An object a Variant can refer to. Assigning an object to a value property takes its
 // default value, as the system's properties do.
 class Object {
-public:
+  public:
     virtual ~Object() = default;
     virtual Variant defaultValue() const;
 };

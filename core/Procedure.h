@@ -22,7 +22,7 @@ namespace maroset {
 //         proc.run([&] { driver_->AddItem(TagAddress, CInt(TagID)); });
 //     }
 class Procedure {
-public:
+  public:
     enum class Trap { Switched, Always, ResumeNext };
 
     Procedure(const char* module, const char* name, Trap trap = Trap::Switched);
@@ -46,9 +46,13 @@ public:
             } catch (VbError& e) {
                 stamp(e);
                 switch (resume(e)) {
-                    case 0: continue;
-                    case 1: return;
-                    default: left_ = true; return;
+                    case 0:
+                        continue;
+                    case 1:
+                        return;
+                    default:
+                        left_ = true;
+                        return;
                 }
             }
         }
@@ -57,7 +61,7 @@ public:
     // True once the handler answered "leave": the remaining statements do not run.
     bool left() const { return left_; }
 
-private:
+  private:
     void stamp(VbError& e) const;
     int16_t resume(const VbError& e);
 

@@ -22,7 +22,7 @@ class ClsNodeDBInterface;
 // current() creates the runtime on first use, on the real platform. Tests install a fresh one
 // for each test with ScopedRuntime, so no test sees another's nodes, counters or files.
 class Runtime {
-public:
+  public:
     using MessageBox = ErrorTrap::MessageBox;
 
     // The real platform: a poll loop, the system clock, the default drive root, message boxes
@@ -61,7 +61,7 @@ public:
     std::shared_ptr<nodeDB> nodes();
     ClsNodeDBInterface& hiddenInterface();
 
-private:
+  private:
     std::unique_ptr<platform::EventLoop> loop_;
     std::unique_ptr<platform::Clock> clock_;
     platform::FileSystem files_;

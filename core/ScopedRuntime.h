@@ -9,7 +9,7 @@ namespace maroset {
 // Installs a runtime as the current one for its own lifetime; on destruction the runtime is
 // torn down (nodes first) while still current, then the previous one is restored.
 class ScopedRuntime {
-public:
+  public:
     explicit ScopedRuntime(std::unique_ptr<Runtime> runtime);
     ~ScopedRuntime();
     ScopedRuntime(const ScopedRuntime&) = delete;
@@ -18,7 +18,7 @@ public:
     Runtime& operator*() const { return *runtime_; }
     Runtime* operator->() const { return runtime_.get(); }
 
-private:
+  private:
     std::unique_ptr<Runtime> runtime_;
     Runtime* previous_;
 };

@@ -9,7 +9,7 @@ namespace maroset {
 // unsubscribed when the handle is destroyed or reset. Safe to destroy after the event's
 // source is gone.
 class Subscription {
-public:
+  public:
     Subscription() = default;
     explicit Subscription(std::function<void()> cancel) : cancel_(std::move(cancel)) {}
     Subscription(Subscription&& other) noexcept : cancel_(std::exchange(other.cancel_, {})) {}
@@ -29,7 +29,7 @@ public:
     }
     explicit operator bool() const noexcept { return static_cast<bool>(cancel_); }
 
-private:
+  private:
     std::function<void()> cancel_;
 };
 

@@ -3,8 +3,8 @@
 #include <cstdint>
 #include <string>
 
-#include "core/VbArray.h"
 #include "core/Variant.h"
+#include "core/VbArray.h"
 
 namespace maroset {
 
@@ -16,7 +16,6 @@ void ReportValues(VbArray<int32_t>& handles, VbArray<Variant>& values);
 // A report of a single tag: handles (h), count 1, values (v).
 void ReportValue(int32_t handle, const Variant& value);
 // An error report: driver label, "Class.Procedure", message.
-void ReportError(const std::string& driver, const std::string& fromSub,
-                 const std::string& message);
+void ReportError(const std::string& driver, const std::string& fromSub, const std::string& message);
 
 }  // namespace maroset

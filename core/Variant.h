@@ -34,7 +34,7 @@ enum class VarType : uint16_t {
 // A Variant holding an array has value semantics: copies share storage until one of them
 // is changed through array().
 class Variant {
-public:
+  public:
     Variant() noexcept = default;
     Variant(int16_t v) noexcept : value_(v) {}
     Variant(int32_t v) noexcept : value_(v) {}
@@ -76,13 +76,13 @@ public:
     // containers; the language's comparison with its coercions is Compare() in Conversions.h.
     friend bool operator==(const Variant& a, const Variant& b);
 
-private:
+  private:
     struct NullValue {
         friend bool operator==(NullValue, NullValue) { return true; }
     };
-    using Storage = std::variant<std::monostate, NullValue, int16_t, int32_t, float, double,
-                                 std::string, bool, std::shared_ptr<VbArray<Variant>>,
-                                 std::shared_ptr<Object>>;
+    using Storage =
+        std::variant<std::monostate, NullValue, int16_t, int32_t, float, double, std::string, bool,
+                     std::shared_ptr<VbArray<Variant>>, std::shared_ptr<Object>>;
     Storage value_;
 };
 

@@ -42,7 +42,7 @@ std::string ErrorDescription(int32_t number);
 // system carries line numbers). The source is filled in by the first trapping procedure
 // the error passes through when the thrower left it empty.
 class VbError : public std::exception {
-public:
+  public:
     explicit VbError(int32_t number, std::string description = {}, std::string source = {});
 
     int32_t number() const noexcept { return number_; }
@@ -53,7 +53,7 @@ public:
 
     const char* what() const noexcept override { return description_.c_str(); }
 
-private:
+  private:
     int32_t number_;
     std::string description_;
     std::string source_;

@@ -6,8 +6,8 @@
 #include <vector>
 
 #include "core/Event.h"
-#include "core/VbArray.h"
 #include "core/Variant.h"
+#include "core/VbArray.h"
 #include "core/node.h"
 
 namespace maroset {
@@ -24,7 +24,7 @@ using DriverErrorEvent = Event<const std::string&, const std::string&, const std
 //
 // Every operation runs under the trap with module name "NodeDB".
 class nodeDB {
-public:
+  public:
     nodeDB();
     ~nodeDB();
     nodeDB(const nodeDB&) = delete;
@@ -56,7 +56,7 @@ public:
     ValueChangeEvent ValueChange;
     DriverErrorEvent DriverError;
 
-private:
+  private:
     struct Collection;
     Collection& collection();
 

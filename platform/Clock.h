@@ -14,7 +14,7 @@ inline constexpr DateTime ZeroDate{
 
 // Wall-clock date and time.
 class Clock {
-public:
+  public:
     virtual ~Clock() = default;
     virtual DateTime now() const = 0;
 };

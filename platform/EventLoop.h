@@ -22,7 +22,7 @@ namespace maroset::platform {
 // - Due timers run in due-time order; timers due at the same time in the order they were
 //   scheduled. Posted calls run in the order they were posted, before timers of the same turn.
 class EventLoop {
-public:
+  public:
     using Duration = std::chrono::milliseconds;
     using TimerId = uint64_t;
     using WatchId = uint64_t;

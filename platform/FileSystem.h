@@ -13,7 +13,7 @@ namespace maroset::platform {
 // is refused with Path/File access error (75). Failures are VbErrors with the language's
 // file error numbers (53 File not found, 75 Path/File access error, 76 Path not found).
 class FileSystem {
-public:
+  public:
     explicit FileSystem(std::filesystem::path driveRoot);
 
     // $XDG_DATA_HOME/maroset/drive_c, falling back to ~/.local/share/maroset/drive_c.
@@ -32,7 +32,7 @@ public:
     // Opens the file for appending (creating it), writes bytes and closes it.
     void AppendText(std::string_view path, std::string_view bytes) const;
 
-private:
+  private:
     std::filesystem::path root_;
 };
 

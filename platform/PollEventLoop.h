@@ -9,7 +9,7 @@ namespace maroset::platform {
 // The real loop, on poll(2) and the monotonic clock. It sleeps in poll() until the next timer
 // is due or a descriptor is ready, so an idle host uses no CPU.
 class PollEventLoop final : public EventLoop {
-public:
+  public:
     PollEventLoop();
     ~PollEventLoop() override;
 
@@ -24,7 +24,7 @@ public:
     void runFor(Duration d) override;
     void stop() override;
 
-private:
+  private:
     struct Impl;
     std::unique_ptr<Impl> impl_;
 };

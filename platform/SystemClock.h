@@ -6,7 +6,7 @@ namespace maroset::platform {
 
 // The machine's local time.
 class SystemClock final : public Clock {
-public:
+  public:
     DateTime now() const override;
 };
 

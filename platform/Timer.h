@@ -15,7 +15,7 @@ namespace maroset::platform {
 // - A Tick handler may disable, re-arm or destroy the timer. A tick is never raised while the
 //   previous tick's handler is still running (a handler that pumps the loop is not re-entered).
 class Timer {
-public:
+  public:
     explicit Timer(EventLoop& loop);
     ~Timer();
     Timer(const Timer&) = delete;
@@ -28,7 +28,7 @@ public:
 
     Event<> Tick;
 
-private:
+  private:
     struct State;
     std::shared_ptr<State> state_;
 };

@@ -11,7 +11,7 @@ namespace maroset::platform {
 // watchdog runs in microseconds. Watched descriptors are polled without waiting at each turn.
 // run() advances time to each next timer until stop() or nothing is left to do.
 class VirtualEventLoop final : public EventLoop {
-public:
+  public:
     VirtualEventLoop();
     ~VirtualEventLoop() override;
 
@@ -31,7 +31,7 @@ public:
     void runFor(Duration d) override;
     void stop() override;
 
-private:
+  private:
     struct Impl;
     std::unique_ptr<Impl> impl_;
 };
