@@ -32,37 +32,16 @@ TEST_F(MemTagTest, WriteIsReportedBackOnceBeforeWriteItemReturns) {
     EXPECT_EQ(c.valuesLower, 1);
 }
 
-TEST_F(MemTagTest, EverythingElseDoesNothing) {
-    EXPECT_FALSE(driver.AddItem("Level", 5));
-    VbArray<std::string> names(1, 1);
-    VbArray<int32_t> handles(1, 1);
-    EXPECT_FALSE(driver.AddItems(1, names, handles));
+TEST_F(MemTagTest, EverythingElseDoesNothingAndEveryPropertyIsAccepted) {
+    EXPECT_FALSE(driver.AddItem("Level", 5));  // although the tag is usable
     EXPECT_EQ(driver.ReadItem(5), 0);
-    EXPECT_EQ(driver.ReadAllItems(), 0);
     VbArray<Variant> data(0, 1);
-    EXPECT_EQ(driver.WriteArray(5, data), 0);
-    int32_t code = 3;
-    EXPECT_EQ(driver.GetErrorString(code), "");
+    EXPECT_EQ(driver.WriteArray(5, data), 0);  // arrays are not looped back
     driver.IsActive(true);
-    driver.RemoveItem(5);
-    driver.PostMessage(code);
-    driver.startup("x", "y");
-    driver.shutdown();
-    EXPECT_TRUE(host.changes.empty());
-}
-
-TEST_F(MemTagTest, AcceptsEveryConfigurationProperty) {
     driver.ScanRate(Variant(100));
-    driver.OPCTopic(Variant("t"));
-    driver.ServerName(Variant("s"));
-    driver.SerialPort(Variant(1));
-    driver.BaudRate(Variant(9600));
     driver.TagPrefex(Variant("p"));
-    driver.IPAddress(Variant("127.0.0.1"));
-    driver.Port(Variant(502));
-    driver.NodeName("N");
     EXPECT_EQ(driver.ScanRate(), Variant(100));
-    EXPECT_EQ(driver.NodeName(), "N");
+    EXPECT_TRUE(host.changes.empty());
 }
 
 class BareDriver final : public Driver {
@@ -74,12 +53,11 @@ TEST(DriverContract, MissingMembersFailAsACallByNameWould) {
     BareDriver d;
     int32_t code = 0;
     VbArray<Variant> data;
-    for (const auto& call : std::initializer_list<std::function<void()>>{
-             [&] { d.shutdown(); }, [&] { d.startup("a", "b"); }, [&] { d.PostMessage(code); },
-             [&] { d.IsActive(true); }, [&] { d.WriteItem(1, 1); }, [&] { d.AddItem("a", 1); },
-             [&] { d.ReadItem(1); }, [&] { d.WriteArray(1, data); }}) {
-        EXPECT_EQ(errorOf([&] { call(); }), err::NotSupported);
-    }
+    EXPECT_EQ(errorOf([&] { d.PostMessage(code); }), err::NotSupported);
+    EXPECT_EQ(errorOf([&] { d.WriteItem(1, 1); }), err::NotSupported);
+    EXPECT_EQ(errorOf([&] { d.WriteArray(1, data); }), err::NotSupported);
+    d.OPCTopic(Variant("accepted"));  // properties are always there
+    EXPECT_EQ(d.OPCTopic(), Variant("accepted"));
 }
 
 }  // namespace
