@@ -2,149 +2,94 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <memory>
 #include <vector>
 
-#include "core/VbError.h"
 #include "platform/VirtualEventLoop.h"
+#include "support/ErrorOf.h"
 
 namespace maroset::platform {
 namespace {
 
 using std::chrono::milliseconds;
+using Ticks = std::vector<int64_t>;
 
 // A timer control on the virtual clock, with the time of every tick.
 class TimerControl : public ::testing::Test {
   protected:
-    TimerControl() : timer(std::make_unique<Timer>(loop)) {
-        sub = timer->Tick.subscribe([this] {
-            ticks.push_back(loop.now().count());
-            if (onTick) onTick();
-        });
-    }
-
     void start(int32_t interval) {
         timer->Interval(interval);
         timer->Enabled(true);
     }
+    void advance(int64_t ms) { loop.advance(milliseconds(ms)); }
 
     VirtualEventLoop loop;
-    std::unique_ptr<Timer> timer;
-    std::vector<int64_t> ticks;
+    std::unique_ptr<Timer> timer = std::make_unique<Timer>(loop);
+    Ticks ticks;
     std::function<void()> onTick;
-    Subscription sub;
+    Subscription sub = timer->Tick.subscribe([this] {
+        ticks.push_back(loop.now().count());
+        if (onTick) onTick();
+    });
 };
 
-TEST_F(TimerControl, TicksEveryIntervalWhileEnabled) {
-    start(1000);
-    loop.advance(milliseconds(3500));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{1000, 2000, 3000}));
-    timer->Enabled(false);
-    loop.advance(milliseconds(5000));
-    EXPECT_EQ(ticks.size(), 3u);
-    EXPECT_EQ(loop.pendingTimers(), 0u);
-}
-
-TEST_F(TimerControl, FiveSecondWatchdogFiresAtFiveThousandNotBefore) {
-    start(5000);
-    loop.advance(milliseconds(4999));
-    EXPECT_TRUE(ticks.empty());
-    loop.advance(milliseconds(1));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{5000}));
-}
-
-TEST_F(TimerControl, IntervalZeroNeverTicks) {
+TEST_F(TimerControl, TicksEveryIntervalWhileEnabledAndNeverAtIntervalZero) {
     timer->Enabled(true);
-    loop.advance(milliseconds(10000));
-    EXPECT_TRUE(ticks.empty());
-    EXPECT_EQ(loop.pendingTimers(), 0u);
-    timer->Interval(200);  // enabled already: the count starts now
-    loop.advance(milliseconds(200));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{10200}));
+    advance(5000);
+    EXPECT_EQ(test::errorOf([&] { timer->Interval(-1); }), 380);
+    timer->Interval(1000);  // enabled already: the count starts now
+    advance(3500);
     timer->Interval(0);
-    loop.advance(milliseconds(10000));
-    EXPECT_EQ(ticks.size(), 1u);
-}
-
-TEST_F(TimerControl, DisableThenEnableRestartsTheCount) {
-    start(1000);
-    loop.advance(milliseconds(700));
-    timer->Enabled(false);
-    timer->Enabled(true);
-    loop.advance(milliseconds(999));
-    EXPECT_TRUE(ticks.empty());
-    loop.advance(milliseconds(1));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{1700}));
-}
-
-TEST_F(TimerControl, SettingIntervalWhileEnabledRestartsTheCount) {
-    start(1000);
-    loop.advance(milliseconds(900));
-    timer->Interval(1000);
-    loop.advance(milliseconds(1000));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{1900}));
-}
-
-TEST_F(TimerControl, EnablingAnEnabledTimerKeepsItsCount) {
-    start(1000);
-    loop.advance(milliseconds(600));
-    timer->Enabled(true);
-    loop.advance(milliseconds(400));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{1000}));
-}
-
-TEST_F(TimerControl, SettingsAreKeptWhileDisabled) {
-    timer->Interval(250);
-    EXPECT_EQ(timer->Interval(), 250);
-    EXPECT_FALSE(timer->Enabled());
-    loop.advance(milliseconds(1000));
-    EXPECT_TRUE(ticks.empty());
-    EXPECT_THROW(timer->Interval(-1), VbError);
-    EXPECT_EQ(timer->Interval(), 250);
-}
-
-TEST_F(TimerControl, HandlerMayDisableTheTimer) {
-    onTick = [this] { timer->Enabled(false); };
-    start(100);
-    loop.advance(milliseconds(1000));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{100}));
+    advance(5000);
+    EXPECT_EQ(ticks, (Ticks{6000, 7000, 8000}));
     EXPECT_EQ(loop.pendingTimers(), 0u);
 }
 
-TEST_F(TimerControl, HandlerMayRestartTheTimerWithANewInterval) {
+TEST_F(TimerControl, FiveSecondTimerTicksAtFiveThousandAndRestartsOnlyWhenReenabled) {
+    start(5000);
+    advance(4999);
+    EXPECT_TRUE(ticks.empty());
+    advance(3001);
+    timer->Enabled(true);  // already enabled: the count goes on, tick at 10000
+    advance(2500);
+    timer->Enabled(false);
+    timer->Enabled(true);  // tick at 15500
+    advance(7000);
+    timer->Interval(5000);  // tick at 22500
+    advance(5000);
+    EXPECT_EQ(ticks, (Ticks{5000, 10000, 15500, 22500}));
+}
+
+TEST_F(TimerControl, HandlerMayRearmDisableOrDestroyItsTimer) {
     onTick = [this] {
         if (ticks.size() == 1) timer->Interval(300);
+        if (ticks.size() == 3) timer->Enabled(false);
     };
     start(100);
-    loop.advance(milliseconds(1000));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{100, 400, 700, 1000}));
-}
-
-TEST_F(TimerControl, HandlerMayDestroyTheTimer) {
+    advance(1000);
+    EXPECT_EQ(loop.pendingTimers(), 0u);
     onTick = [this] { timer.reset(); };
-    start(100);
-    loop.advance(milliseconds(1000));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{100}));
+    timer->Enabled(true);
+    advance(1000);
+    EXPECT_EQ(ticks, (Ticks{100, 400, 700, 1300}));
     EXPECT_EQ(loop.pendingTimers(), 0u);
 }
 
 TEST_F(TimerControl, HandlerThatYieldsIsNotReenteredAndTicksOnceAfter) {
-    int depth = 0;
-    int maxDepth = 0;
+    int depth = 0, maxDepth = 0;
     onTick = [&] {
-        ++depth;
-        maxDepth = std::max(maxDepth, depth);
+        maxDepth = std::max(maxDepth, ++depth);
         // The first tick yields for long enough that two more ticks fall due inside it.
-        if (ticks.size() == 1) loop.advance(milliseconds(2500));
+        if (ticks.size() == 1) advance(2500);
         --depth;
     };
     start(1000);
-    loop.advance(milliseconds(1000));
+    advance(1000);
+    advance(1000);
     EXPECT_EQ(maxDepth, 1);
     // The ticks missed during the handler collapse into one, right after it returns.
-    EXPECT_EQ(ticks, (std::vector<int64_t>{1000, 3500}));
-    loop.advance(milliseconds(1000));
-    EXPECT_EQ(ticks, (std::vector<int64_t>{1000, 3500, 4500}));
+    EXPECT_EQ(ticks, (Ticks{1000, 3500, 4500}));
 }
 
 }  // namespace
