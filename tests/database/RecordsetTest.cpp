@@ -1,199 +1,103 @@
 #include "platform/Recordset.h"
 
 #include <gtest/gtest.h>
-#include <sqlite3.h>
 
-#include <functional>
-#include <string>
-
-#include "core/VbError.h"
-#include "platform/Database.h"
+#include "database/ProjectDatabase.h"
 #include "support/ErrorOf.h"
-#include "support/TempDir.h"
 
 namespace maroset::platform {
 namespace {
 
-namespace fs = std::filesystem;
-
 using test::errorOf;
 
-class RecordsetFixture : public ::testing::Test {
-  protected:
-    void SetUp() override {
-        auto db = Database::Create(file());
-        db->Execute(
-            "CREATE TABLE TagValues (ID INTEGER PRIMARY KEY AUTOINCREMENT, TagName TEXT, "
-            "TagValue TEXT)");
-        db->Execute("CREATE UNIQUE INDEX IDIndex ON TagValues (ID)");
-        // A table without an integer key, as a project database may have.
-        db->Execute(
-            "CREATE TABLE Nodes (Name TEXT, Driver TEXT, UpdateRate INTEGER, "
-            "Port NUMERIC)");
-        db->Execute("INSERT INTO TagValues (TagName, TagValue) VALUES ('Level', '0')");
-        db->Execute("INSERT INTO TagValues (TagName, TagValue) VALUES ('Flow', '1')");
-        db->Execute("INSERT INTO Nodes VALUES ('Line1', 'DiskTag', 1000, 502)");
-        db->Execute("INSERT INTO Nodes VALUES ('Line1', 'DiskTag', 1000, 502)");
-        db->Execute("INSERT INTO Nodes VALUES ('Line2', 'MemTag', 500, NULL)");
-    }
-    fs::path file() const { return dir_.path() / "Line1.mdb"; }
+// Edit, set one field and Update: the way the system changes a row.
+void change(Recordset& rs, const std::string& field, const Variant& value) {
+    rs.Edit();
+    rs.setField(field, value);
+    rs.Update();
+}
 
-    // A fresh connection of our own: what a restarted process would read.
-    Variant freshValue(const std::string& query, const std::string& field) const {
-        auto rs = Database::Open(file())->OpenRecordset(query);
-        rs->MoveFirst();
-        return rs->Fields(field);
-    }
+using RecordsetReading = ProjectDatabase;
 
-    test::TempDir dir_;
-};
-
-using RecordsetCursor = RecordsetFixture;
-
-TEST_F(RecordsetCursor, WalksEveryRowThenReportsEndOfFile) {
+TEST_F(RecordsetReading, WalksEveryRowThenHasNoCurrentRecord) {
     auto rs = Database::Open(file())->OpenRecordset("select * from Nodes ");
     ASSERT_EQ(rs->RecordCount(), 3);
-    rs->MoveFirst();
+    EXPECT_EQ(errorOf([&] { rs->Fields("OPCServer"); }), err::ItemNotFound);
+    EXPECT_EQ(errorOf([&] { change(*rs, "OPCServer", "x"); }), err::ItemNotFound);
     std::string names;
-    while (!rs->eof()) {
-        names += rs->Fields("Name").string() + ";";
-        rs->MoveNext();
-    }
+    for (rs->MoveFirst(); !rs->eof(); rs->MoveNext()) names += rs->Fields("Name").string() + ";";
     EXPECT_EQ(names, "Line1;Line1;Line2;");
     EXPECT_EQ(errorOf([&] { rs->MoveNext(); }), err::NoCurrentRecord);
     EXPECT_EQ(errorOf([&] { rs->Fields("Name"); }), err::NoCurrentRecord);
     EXPECT_EQ(errorOf([&] { rs->Edit(); }), err::NoCurrentRecord);
-}
-
-TEST_F(RecordsetCursor, EmptyRecordsetHasNoCurrentRecord) {
-    auto rs = Database::Open(file())->OpenRecordset(
-        "select * from TagValues  where TagName like 'Missing'");
-    EXPECT_EQ(rs->RecordCount(), 0);
-    EXPECT_TRUE(rs->eof());
-    EXPECT_TRUE(rs->bof());
+    rs = Database::Open(file())->OpenRecordset("select * from Nodes where Name like 'None'");
+    EXPECT_TRUE(rs->eof() && rs->bof());
     EXPECT_EQ(errorOf([&] { rs->MoveFirst(); }), err::NoCurrentRecord);
-    EXPECT_EQ(errorOf([&] { rs->Fields("TagValue"); }), err::NoCurrentRecord);
 }
 
-TEST_F(RecordsetCursor, UnknownFieldIsItemNotFound) {
-    auto rs = Database::Open(file())->OpenRecordset("select * from Nodes ");
-    EXPECT_EQ(errorOf([&] { rs->Fields("OPCServer"); }), err::ItemNotFound);
-    rs->Edit();
-    EXPECT_EQ(errorOf([&] { rs->setField("OPCServer", Variant("x")); }), err::ItemNotFound);
+TEST_F(RecordsetReading, ValuesComeAsTheDatabaseDeliversThemByNameInAnyCase) {
+    auto rs = Database::Open(file())->OpenRecordset(
+        "select -7 AS I, 5000000000 AS Big, 2.5 AS R, '12.5' AS T, NULL AS N, x'00ff41' AS B, "
+        "Port from Nodes");
+    EXPECT_EQ(rs->Fields("I"), Variant(-7));
+    EXPECT_EQ(rs->Fields("Big"), Variant(5000000000.0));
+    EXPECT_EQ(rs->Fields("R"), Variant(2.5));
+    EXPECT_EQ(rs->Fields("t"), Variant("12.5"));
+    EXPECT_TRUE(rs->Fields("N").isNull());
+    EXPECT_EQ(rs->Fields("B"), Variant(std::string("\0\xff\x41", 3)));
+    EXPECT_EQ(rs->Fields("port"), Variant(502));  // a NUMERIC column
 }
 
-TEST_F(RecordsetCursor, NumbersAndNullsComeAsStored) {
-    auto rs = Database::Open(file())->OpenRecordset("select * from Nodes ");
-    rs->MoveFirst();
-    EXPECT_EQ(rs->Fields("UpdateRate"), Variant(int32_t{1000}));
-    EXPECT_EQ(rs->Fields("port"), Variant(int32_t{502}));
-    rs->MoveNext();
-    rs->MoveNext();
-    EXPECT_TRUE(rs->Fields("Port").isNull());
-}
+using RecordsetUpdates = ProjectDatabase;
 
-using RecordsetUpdates = RecordsetFixture;
-
+// The text written for each kind of value is checked through the disk tag driver.
 TEST_F(RecordsetUpdates, EditWritesTheTextOfTheValueAndAFreshConnectionSeesIt) {
-    {
-        auto rs = Database::Open(file())->OpenRecordset(
-            "select * from TagValues  where TagName like 'Level'");
-        rs->MoveFirst();
-        rs->Edit();
-        rs->setField("Tagvalue", Variant(12.5));
-        rs->Update();
-        EXPECT_EQ(rs->Fields("TagValue"), Variant("12.5")) << "row not read back after Update";
-    }
-    EXPECT_EQ(freshValue("select * from TagValues where TagName like 'Level'", "TagValue"),
-              Variant("12.5"));
-    EXPECT_EQ(freshValue("select * from TagValues where TagName like 'Flow'", "TagValue"),
-              Variant("1"))
-        << "another row changed";
-}
-
-TEST_F(RecordsetUpdates, TextFieldsTakeTheLanguagesTextOfEveryKind) {
-    auto db = Database::Open(file());
-    auto store = [&](const Variant& v) {
-        auto rs = db->OpenRecordset("select * from TagValues  where TagName like 'Flow'");
-        rs->MoveFirst();
-        rs->Edit();
-        rs->setField("TagValue", v);
-        rs->Update();
-        return freshValue("select * from TagValues where TagName like 'Flow'", "TagValue");
-    };
-    EXPECT_EQ(store(Variant(int16_t{0})), Variant("0"));
-    EXPECT_EQ(store(Variant(true)), Variant("True"));
-    EXPECT_EQ(store(Variant(1.0f / 3.0f)), Variant("0.3333333"));
-    EXPECT_EQ(store(Variant("abc")), Variant("abc"));
-    EXPECT_TRUE(store(Variant::Null()).isNull());
+    auto rs = Database::Open(file())->OpenRecordset("select * from TagValues where ID = 3");
+    change(*rs, "Tagvalue", 12.5);
+    EXPECT_EQ(rs->Fields("TagValue"), Variant("12.5")) << "row not read back after Update";
+    EXPECT_EQ(fresh("select TagValue from TagValues where TagName = 'Flow'"), Variant("12.5"));
+    EXPECT_EQ(fresh("select TagValue from TagValues where TagName = 'Level'"), Variant("0"));
 }
 
 TEST_F(RecordsetUpdates, AddNewInsertsARowWithItsKeyAndKeepsTheCursor) {
-    auto rs =
-        Database::Open(file())->OpenRecordset("select * from TagValues  where TagName like 'Temp'");
-    ASSERT_TRUE(rs->eof());
+    auto rs = Database::Open(file())->OpenRecordset("select * from TagValues where ID > 4");
     rs->AddNew();
     rs->setField("TagName", Variant("Temp"));
     rs->setField("Tagvalue", Variant(int16_t{0}));
     rs->Update();
     EXPECT_TRUE(rs->eof()) << "the current record moved on AddNew";
-    EXPECT_EQ(rs->RecordCount(), 1);
     rs->MoveFirst();
-    EXPECT_EQ(rs->Fields("ID"), Variant(int32_t{3}));
-    EXPECT_EQ(freshValue("select * from TagValues where TagName like 'Temp'", "TagValue"),
-              Variant("0"));
+    EXPECT_EQ(rs->Fields("ID"), Variant(5));
 }
 
 TEST_F(RecordsetUpdates, RowsWithoutAKeyAreFoundByTheirValues) {
     auto rs = Database::Open(file())->OpenRecordset("select * from Nodes ");
-    rs->MoveFirst();
-    rs->MoveNext();  // the second of two identical rows
-    rs->Edit();
-    rs->setField("Driver", Variant("OPC"));
-    rs->Update();
+    rs->MoveNext();  // the second of two identical rows: exactly one of them changes
+    change(*rs, "Driver", "OPC");
     rs->MoveNext();
-    rs->Edit();
-    rs->setField("UpdateRate", Variant("250"));  // text into a number column
-    rs->Update();
-    auto check = Database::Open(file())->OpenRecordset("select * from Nodes ");
-    std::string drivers;
-    for (check->MoveFirst(); !check->eof(); check->MoveNext())
-        drivers += check->Fields("Driver").string() + ";";
-    EXPECT_EQ(drivers, "OPC;DiskTag;MemTag;") << "exactly one of the two rows changes";
-    EXPECT_EQ(freshValue("select * from Nodes where Name like 'Line2'", "UpdateRate"),
-              Variant(int32_t{250}));
+    change(*rs, "UpdateRate", "250");  // text into a number column
+    EXPECT_EQ(fresh("select group_concat(Driver) from Nodes"), Variant("OPC,DiskTag,MemTag"));
+    EXPECT_EQ(fresh("select UpdateRate from Nodes where Name = 'Line2'"), Variant(250));
 }
 
-TEST_F(RecordsetUpdates, UpdateOfARowDeletedMeanwhileFails) {
-    auto rs = Database::Open(file())->OpenRecordset("select * from TagValues");
-    rs->MoveFirst();
-    Database::Open(file())->Execute("DELETE FROM TagValues WHERE TagName = 'Level'");
-    rs->Edit();
-    rs->setField("TagValue", Variant("9"));
-    EXPECT_EQ(errorOf([&] { rs->Update(); }), 3167);
-}
-
-TEST_F(RecordsetUpdates, UpdateWithoutEditOrAddNewFails) {
-    auto rs = Database::Open(file())->OpenRecordset("select * from TagValues");
-    rs->MoveFirst();
+TEST_F(RecordsetUpdates, UpdateNeedsEditOrAddNewARowThatStillExistsAndOneTable) {
+    auto db = Database::Open(file());
+    auto rs = db->OpenRecordset("select * from TagValues");
     EXPECT_EQ(errorOf([&] { rs->Update(); }), 3020);
     EXPECT_EQ(errorOf([&] { rs->setField("TagValue", Variant("1")); }), 3020);
     rs->Edit();
     rs->setField("TagValue", Variant("1"));
     rs->MoveNext();  // leaving the record drops the edit
     EXPECT_EQ(errorOf([&] { rs->Update(); }), 3020);
-}
-
-TEST_F(RecordsetUpdates, QueriesNotOnOneTableAreReadOnly) {
-    auto db = Database::Open(file());
-    auto rs = db->OpenRecordset("select count(*) AS n from TagValues");
-    EXPECT_FALSE(rs->Updatable());
-    EXPECT_EQ(errorOf([&] { rs->AddNew(); }), 3027);
-    auto joined =
-        db->OpenRecordset("select a.TagName, b.TagName AS Other from TagValues a, TagValues b");
-    EXPECT_FALSE(joined->Updatable());
-    joined->MoveFirst();
-    EXPECT_EQ(errorOf([&] { joined->Edit(); }), 3027);
+    Database::Open(file())->Execute("DELETE FROM TagValues WHERE TagName = 'Level2'");
+    EXPECT_EQ(errorOf([&] { change(*rs, "TagValue", "9"); }), 3167);
+    auto count = db->OpenRecordset("select count(*) AS n from TagValues");
+    EXPECT_FALSE(count->Updatable());
+    EXPECT_EQ(errorOf([&] { count->AddNew(); }), 3027);
+    rs = db->OpenRecordset("select * from TagValues where TagName like 'Flow'");
+    db.reset();  // the rows outlive their database
+    change(*rs, "TagValue", "55");
+    EXPECT_EQ(fresh("select TagValue from TagValues where TagName = 'Flow'"), Variant("55"));
 }
 
 }  // namespace
