@@ -71,22 +71,30 @@ int32_t ClsDriverDiskTag::slotOf(int32_t handle) const {
     return i;
 }
 
-std::string ClsDriverDiskTag::rowQuery(const std::string& name) {
+std::string ClsDriverDiskTag::tagName(Procedure& proc, int32_t handle) const {
+    int32_t slot = 0;
+    std::string name;
+    proc.run([&] { slot = slotOf(handle); });
+    proc.run([&] { name = tagNames_(slot); });
+    return name;
+}
+
+std::unique_ptr<Recordset> ClsDriverDiskTag::queryRow(Procedure& proc,
+                                                      const std::string& name) const {
+    std::unique_ptr<Database> db;
+    std::unique_ptr<Recordset> rs;
+    proc.run([&] { db = openFile(path_); });
     // The name goes in as it stands: the engine's wildcards in it match other rows, and a quote
     // fails the query. Two blanks before "where", as always.
-    return "select * from TagValues  where TagName like '" + name + "'";
+    proc.run([&] {
+        rs = use(db).OpenRecordset("select * from TagValues  where TagName like '" + name + "'");
+    });
+    return rs;  // keeps the file open until the caller's operation ends
 }
 
 int32_t ClsDriverDiskTag::WriteItem(int32_t ClientHandle, const Variant& data) {
     Procedure proc(kModule, "WriteItem");
-    int32_t slot = 0;
-    std::string name;
-    std::unique_ptr<Database> db;
-    std::unique_ptr<Recordset> rs;
-    proc.run([&] { slot = slotOf(ClientHandle); });
-    proc.run([&] { name = tagNames_(slot); });
-    proc.run([&] { db = openFile(path_); });
-    proc.run([&] { rs = use(db).OpenRecordset(rowQuery(name)); });
+    const auto rs = queryRow(proc, tagName(proc, ClientHandle));
     // No row: No current record (3021) here, and nothing is written or reported.
     proc.run([&] { use(rs).MoveFirst(); });
     proc.run([&] { use(rs).Edit(); });
@@ -114,10 +122,7 @@ bool ClsDriverDiskTag::AddItem(const std::string& TagName, int16_t ClientHandle)
     proc.run([&] { tagNames_(n) = TagName; });
     proc.run([&] { clientHandles_(n) = ClientHandle; });
 
-    std::unique_ptr<Database> db;
-    std::unique_ptr<Recordset> rs;
-    proc.run([&] { db = openFile(path_); });
-    proc.run([&] { rs = use(db).OpenRecordset(rowQuery(TagName)); });
+    const auto rs = queryRow(proc, TagName);
     // A condition that fails under the trap counts as false: no row is added blindly.
     bool missing = false;
     proc.run([&] { missing = use(rs).RecordCount() == 0; });
@@ -136,14 +141,7 @@ bool ClsDriverDiskTag::AddItems(int16_t, VbArray<std::string>&, VbArray<int32_t>
 
 int32_t ClsDriverDiskTag::ReadItem(int32_t ClientHandle) {
     Procedure proc(kModule, "ReadItem");
-    int32_t slot = 0;
-    std::string name;
-    std::unique_ptr<Database> db;
-    std::unique_ptr<Recordset> rs;
-    proc.run([&] { slot = slotOf(ClientHandle); });
-    proc.run([&] { name = tagNames_(slot); });
-    proc.run([&] { db = openFile(path_); });
-    proc.run([&] { rs = use(db).OpenRecordset(rowQuery(name)); });
+    const auto rs = queryRow(proc, tagName(proc, ClientHandle));
     bool found = false;
     proc.run([&] { found = use(rs).RecordCount() > 0; });
     if (found) {

@@ -1,12 +1,18 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
 #include <string>
 
 #include "core/Driver.h"
 #include "core/VbArray.h"
 
 namespace maroset {
+
+class Procedure;
+namespace platform {
+class Recordset;
+}
 
 // Tags kept on disk, one database file per node: "C:\NUVDiskIO\" + node name + ".mdb", with
 // one table TagValues (ID auto-increment, TagName, TagValue as text, primary index IDIndex).
@@ -60,7 +66,10 @@ class ClsDriverDiskTag final : public Driver {
   private:
     // The slot of the first tag with this handle (9 past the last slot).
     int32_t slotOf(int32_t handle) const;
-    static std::string rowQuery(const std::string& name);
+    // The tag name of a handle and the row query for a name, each step a statement of the
+    // calling operation's procedure, so the trap retries or skips it on its own.
+    std::string tagName(Procedure& proc, int32_t handle) const;
+    std::unique_ptr<platform::Recordset> queryRow(Procedure& proc, const std::string& name) const;
 
     VbArray<std::string> tagNames_;
     VbArray<int32_t> clientHandles_;
