@@ -66,6 +66,16 @@ void DiskTagReadItem(benchmark::State& state) {
 }
 BENCHMARK(DiskTagReadItem)->Unit(benchmark::kMicrosecond);
 
+// Plain SQLite, as the driver does it: open the file afresh and run the row query.
+sqlite3_stmt* openAndFind(const std::string& path, sqlite3*& db) {
+    sqlite3_open_v2(path.c_str(), &db, SQLITE_OPEN_READWRITE, nullptr);
+    sqlite3_busy_timeout(db, 5000);
+    sqlite3_stmt* find = nullptr;
+    sqlite3_prepare_v2(db, "select * from TagValues  where TagName like 'Level'", -1, &find,
+                       nullptr);
+    return find;
+}
+
 // Plain SQLite: the same query with SQLite's own LIKE, then the update by key.
 void SqliteWrite(benchmark::State& state) {
     DiskTagSetup setup;
@@ -73,11 +83,7 @@ void SqliteWrite(benchmark::State& state) {
     double value = 0;
     for (auto _ : state) {
         sqlite3* db = nullptr;
-        sqlite3_open_v2(path.c_str(), &db, SQLITE_OPEN_READWRITE, nullptr);
-        sqlite3_busy_timeout(db, 5000);
-        sqlite3_stmt* find = nullptr;
-        sqlite3_prepare_v2(db, "select * from TagValues  where TagName like 'Level'", -1, &find,
-                           nullptr);
+        sqlite3_stmt* find = openAndFind(path, db);
         if (sqlite3_step(find) == SQLITE_ROW) {
             const sqlite3_int64 id = sqlite3_column_int64(find, 0);
             sqlite3_finalize(find);
@@ -102,11 +108,7 @@ void SqliteRead(benchmark::State& state) {
     const std::string path = setup.file().string();
     for (auto _ : state) {
         sqlite3* db = nullptr;
-        sqlite3_open_v2(path.c_str(), &db, SQLITE_OPEN_READWRITE, nullptr);
-        sqlite3_busy_timeout(db, 5000);
-        sqlite3_stmt* find = nullptr;
-        sqlite3_prepare_v2(db, "select * from TagValues  where TagName like 'Level'", -1, &find,
-                           nullptr);
+        sqlite3_stmt* find = openAndFind(path, db);
         if (sqlite3_step(find) == SQLITE_ROW) {
             std::string text(reinterpret_cast<const char*>(sqlite3_column_text(find, 2)));
             benchmark::DoNotOptimize(text);

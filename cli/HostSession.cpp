@@ -161,6 +161,13 @@ maroset::nodeDB& HostSession::db() {
     return *host_->nodeDB();
 }
 
+std::shared_ptr<node> HostSession::nodeNamed(const std::string& name) {
+    // A node the project does not have is used as an unset object variable would be.
+    auto n = db().getNode(name);
+    if (!n) throw VbError(err::ObjectNotSet);
+    return n;
+}
+
 bool HostSession::projectExists() const {
     // The library takes a path with a drive letter or a backslash as a path on drive C:.
     const std::string& name = options_.project;
@@ -307,8 +314,7 @@ void HostSession::add(CommandTokenizer& args, Reply&) {
     const int32_t handle = integer(args, "HANDLE");
     const std::string address = args.rest();
     if (address.empty()) throw BadCommand("missing ADDRESS");
-    auto n = db().getNode(name);
-    if (!n) throw VbError(err::ObjectNotSet);
+    const auto n = nodeNamed(name);
     n->AddTag(handle, address);
 }
 
@@ -316,8 +322,7 @@ void HostSession::remove(CommandTokenizer& args, Reply&) {
     const std::string name = word(args, "NODE");
     const int32_t handle = integer(args, "HANDLE");
     noMore(args);
-    auto n = db().getNode(name);
-    if (!n) throw VbError(err::ObjectNotSet);
+    const auto n = nodeNamed(name);
     n->RemoveTag(handle);
 }
 
@@ -325,8 +330,7 @@ void HostSession::read(CommandTokenizer& args, Reply&) {
     const std::string name = word(args, "NODE");
     const int32_t handle = integer(args, "HANDLE");
     noMore(args);
-    auto n = db().getNode(name);
-    if (!n) throw VbError(err::ObjectNotSet);
+    const auto n = nodeNamed(name);
     n->ReadTag(handle);
 }
 
@@ -338,8 +342,7 @@ void HostSession::write(CommandTokenizer& args, Reply&) {
     if (!value) throw BadCommand("missing VALUE");
     noMore(args);
     const Variant v = CommandTokenizer::ParseValue(*value);
-    auto n = db().getNode(name);
-    if (!n) throw VbError(err::ObjectNotSet);
+    const auto n = nodeNamed(name);
     n->WriteTag(handle, v);
 }
 
@@ -350,8 +353,7 @@ void HostSession::writearray(CommandTokenizer& args, Reply&) {
     while (auto value = args.next()) items.push_back(CommandTokenizer::ParseValue(*value));
     if (items.empty()) throw BadCommand("missing VALUE");
     VbArray<Variant> values(0, std::move(items));
-    auto n = db().getNode(name);
-    if (!n) throw VbError(err::ObjectNotSet);
+    const auto n = nodeNamed(name);
     n->WriteArray(handle, values);
 }
 

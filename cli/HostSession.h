@@ -17,6 +17,7 @@
 
 namespace maroset {
 class ClsNodeDBInterface;
+class node;
 class nodeDB;
 }  // namespace maroset
 
@@ -75,6 +76,7 @@ class HostSession {
 
     platform::EventLoop& loop();
     maroset::nodeDB& db();
+    std::shared_ptr<node> nodeNamed(const std::string& name);
     bool projectExists() const;
 
     void watchInput();
