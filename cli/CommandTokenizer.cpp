@@ -7,7 +7,7 @@
 #include <limits>
 
 #include "cli/BadCommand.h"
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset::cli {
 

@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 namespace maroset::cli {
 

@@ -14,8 +14,8 @@
 #include "cli/UsageError.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
-#include "core/VbError.h"
 #include "core/nodeDB.h"
+#include "lang/VbError.h"
 #include "platform/Timer.h"
 
 namespace maroset::cli {

@@ -1,7 +1,7 @@
 #include "cli/DemoStation.h"
 
-#include "core/VbError.h"
 #include "core/nodeDB.h"
+#include "lang/VbError.h"
 
 namespace maroset::cli {
 

@@ -3,8 +3,8 @@
 #include <algorithm>
 
 #include "cli/JsonWriter.h"
-#include "core/Conversions.h"
-#include "core/Object.h"
+#include "lang/Conversions.h"
+#include "lang/Object.h"
 
 namespace maroset::cli {
 

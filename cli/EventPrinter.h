@@ -7,8 +7,8 @@
 #include <string_view>
 
 #include "cli/Reply.h"
-#include "core/Variant.h"
-#include "core/VbArray.h"
+#include "lang/Variant.h"
+#include "lang/VbArray.h"
 
 namespace maroset::cli {
 

@@ -12,14 +12,14 @@
 #include "cli/UsageError.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
-#include "core/VbError.h"
 #include "core/nodeDB.h"
+#include "lang/VbError.h"
 
 namespace maroset::cli {
 
 const char* const HostSession::Usage =
-    "usage: maroset run PROJECT [--drive-root DIR] [--com N=DEVICE]... [--modbus-port P]\n"
-    "                   [--trap] [--json]\n"
+    "usage: maroset run PROJECT [--drive-root DIR] [--com [NODE:]N=DEVICE]...\n"
+    "                   [--modbus-port P] [--trap] [--trace] [--json]\n"
     "\n"
     "Loads the nodes of the project database PROJECT, then reads commands from standard\n"
     "input, one per line, and prints every value change and driver error as one line.\n"
@@ -28,9 +28,12 @@ const char* const HostSession::Usage =
     "Options:\n"
     "  --drive-root DIR   directory that stands for drive C: (disk tags, error log)\n"
     "  --com N=DEVICE     serial port N is DEVICE (default /dev/ttyS<N-1>); repeatable\n"
+    "  --com NODE:N=DEVICE  the same for node NODE only (two serial nodes on port 1)\n"
     "  --modbus-port P    connect to couplers on TCP port P instead of 502\n"
     "  --trap             switch error trapping on: errors are logged to\n"
     "                     <drive root>/MarosetErrors.txt instead of reported\n"
+    "  --trace            print what happens on the drivers' links (frames, NAKs,\n"
+    "                     time-outs, bad checks, failed requests) to standard error\n"
     "  --json             one JSON object per line\n"
     "\n"
     "Commands (VALUE: integer, decimal number, true/false, or text; quote text with\n"
@@ -91,8 +94,12 @@ void noMore(CommandTokenizer& args) {
 }
 
 HostOptions parseOptions(const std::vector<std::string>& args, bool& help) {
-    CommandLine cl(
-        {{"drive-root", true}, {"com", true, true}, {"modbus-port", true}, {"trap"}, {"json"}});
+    CommandLine cl({{"drive-root", true},
+                    {"com", true, true},
+                    {"modbus-port", true},
+                    {"trap"},
+                    {"trace"},
+                    {"json"}});
     cl.parse(args);
     help = cl.help();
     HostOptions options;
@@ -105,15 +112,23 @@ HostOptions parseOptions(const std::vector<std::string>& args, bool& help) {
     }
     for (const auto& com : cl.values("com")) {
         const auto eq = com.find('=');
-        const auto port =
-            eq == std::string::npos ? std::nullopt : CommandLine::ParseInteger(com.substr(0, eq));
-        if (!port || *port < 1 || *port > 255 || eq + 1 >= com.size())
-            throw UsageError("option '--com' needs N=DEVICE with N from 1 to 255, not '" + com +
-                             "'");
-        options.serialPorts.emplace_back(*port, com.substr(eq + 1));
+        const std::string left = com.substr(0, eq);
+        const auto colon = left.rfind(':');
+        const std::string node = colon == std::string::npos ? "" : left.substr(0, colon);
+        const auto port = eq == std::string::npos
+                              ? std::nullopt
+                              : CommandLine::ParseInteger(left.substr(colon + 1));
+        if (!port || *port < 1 || *port > 255 || eq + 1 >= com.size() ||
+            (colon != std::string::npos && node.empty()))
+            throw UsageError(
+                "option '--com' needs N=DEVICE or NODE:N=DEVICE with N from 1 to "
+                "255, not '" +
+                com + "'");
+        options.serialPorts.push_back({node, *port, com.substr(eq + 1)});
     }
     options.modbusPort = cl.integer("modbus-port", 1, 65535);
     options.trap = cl.has("trap");
+    options.trace = cl.has("trace");
     options.json = cl.has("json");
     return options;
 }
@@ -141,13 +156,20 @@ HostSession::HostSession(HostOptions options, std::ostream& out, int inputFd)
     : options_(std::move(options)), printer_(out, options_.json), inputFd_(inputFd) {
     Runtime& rt = Runtime::current();
     if (options_.driveRoot) rt.files().setDriveRoot(*options_.driveRoot);
-    for (const auto& [port, device] : options_.serialPorts) rt.mapSerialPort(port, device);
+    for (const auto& m : options_.serialPorts) rt.mapSerialPort(m.port, m.device, m.node);
     if (options_.modbusPort) rt.setModbusPort(*options_.modbusPort);
     if (options_.trap) rt.trap().setEnabled(true);
+    if (options_.trace) {
+        // Standard error, flushed per line: events and replies on standard output stay as
+        // they are, and a user watching a line sees each incident as it happens.
+        rt.trace().setSink(
+            [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
+    }
 }
 
 HostSession::~HostSession() {
     if (inputWatch_) loop().unwatch(*inputWatch_);
+    Runtime::current().trace().setSink({});
     valueChange_.reset();
     driverError_.reset();
     host_.reset();

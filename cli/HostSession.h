@@ -12,7 +12,7 @@
 
 #include "cli/EventPrinter.h"
 #include "cli/Reply.h"
-#include "core/Subscription.h"
+#include "lang/Subscription.h"
 #include "platform/EventLoop.h"
 
 namespace maroset {
@@ -27,11 +27,17 @@ class CommandTokenizer;
 
 // How `maroset run` sets up the runtime before it loads the project.
 struct HostOptions {
+    struct SerialMapping {
+        std::string node;  // empty: every node
+        int32_t port;
+        std::string device;
+    };
     std::string project;
     std::optional<std::filesystem::path> driveRoot;
-    std::vector<std::pair<int32_t, std::string>> serialPorts;  // --com N=DEVICE
+    std::vector<SerialMapping> serialPorts;  // --com [NODE:]N=DEVICE
     std::optional<int32_t> modbusPort;
     bool trap = false;
+    bool trace = false;
     bool json = false;
 };
 

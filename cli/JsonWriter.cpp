@@ -2,8 +2,8 @@
 
 #include <cmath>
 
-#include "core/Conversions.h"
-#include "core/Object.h"
+#include "lang/Conversions.h"
+#include "lang/Object.h"
 
 namespace maroset::cli {
 

@@ -5,7 +5,7 @@
 #include <string_view>
 #include <vector>
 
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 namespace maroset::cli {
 

@@ -8,7 +8,7 @@
 #include "cli/JsonWriter.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/UsageError.h"
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset::cli {
 

@@ -4,8 +4,8 @@
 
 #include <system_error>
 
-#include "core/Conversions.h"
-#include "core/VbError.h"
+#include "lang/Conversions.h"
+#include "lang/VbError.h"
 #include "platform/Database.h"
 #include "platform/Recordset.h"
 

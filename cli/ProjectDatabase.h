@@ -6,7 +6,7 @@
 #include <utility>
 #include <vector>
 
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 namespace maroset::cli {
 

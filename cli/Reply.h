@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 namespace maroset::cli {
 
@@ -16,6 +16,8 @@ struct Reply {
         std::string name;
         Variant driver;  // as the Driver column (or addnode) gave it
     };
+
+    explicit Reply(std::string name) : command(std::move(name)) {}
 
     std::string command;
     bool ok = true;

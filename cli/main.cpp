@@ -10,6 +10,7 @@
 #include "cli/Demo.h"
 #include "cli/HostSession.h"
 #include "cli/ProjectCommands.h"
+#include "cli/SimCommand.h"
 
 namespace {
 
@@ -17,6 +18,7 @@ constexpr const char* kUsage =
     "usage: maroset run PROJECT [options]      serve commands on a project (see run --help)\n"
     "       maroset project init|add|list ...  create and edit a project database\n"
     "       maroset demo [--seconds N] [--json]  watch a small project live\n"
+    "       maroset sim KIND [options]         run one device simulator (see sim --help)\n"
     "       maroset COMMAND --help             help on one command\n";
 
 // A standard descriptor the caller closed would be taken by the next file opened (a project
@@ -48,6 +50,7 @@ int main(int argc, char** argv) {
     if (command == "run") return maroset::cli::HostSession::Main(args);
     if (command == "project") return maroset::cli::ProjectCommands::Main(args);
     if (command == "demo") return maroset::cli::Demo::Main(args);
+    if (command == "sim") return maroset::cli::SimCommand::Main(args);
     std::cerr << "maroset: unknown command '" << command << "'\n" << kUsage;
     return 2;
 }

@@ -2,8 +2,8 @@
 
 #include <memory>
 
-#include "core/Subscription.h"
 #include "core/nodeDB.h"
+#include "lang/Subscription.h"
 
 namespace maroset {
 

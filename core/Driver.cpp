@@ -1,6 +1,6 @@
 #include "core/Driver.h"
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset {
 

@@ -3,8 +3,8 @@
 #include <cstdint>
 #include <string>
 
-#include "core/Variant.h"
-#include "core/VbArray.h"
+#include "lang/Variant.h"
+#include "lang/VbArray.h"
 
 namespace maroset {
 

@@ -4,7 +4,7 @@
 #include <functional>
 #include <string>
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 #include "platform/Clock.h"
 #include "platform/FileSystem.h"
 

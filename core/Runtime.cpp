@@ -4,6 +4,7 @@
 
 #include "core/ClsNodeDBInterface.h"
 #include "core/nodeDB.h"
+#include "lang/Strings.h"
 #include "platform/PollEventLoop.h"
 #include "platform/SystemClock.h"
 
@@ -32,7 +33,8 @@ Runtime::Runtime(std::unique_ptr<platform::EventLoop> loop, std::unique_ptr<plat
       clock_(std::move(clock)),
       files_(std::move(driveRoot)),
       messageBox_([](const std::string& text) { std::cerr << text << std::endl; }),
-      trap_(*clock_, files_, [this](const std::string& text) { MsgBox(text); }) {}
+      trap_(*clock_, files_, [this](const std::string& text) { MsgBox(text); }),
+      serialDevices_(*loop_) {}
 
 Runtime::~Runtime() {
     // Nodes shut their drivers down while the loop, files and trap are still here.
@@ -58,13 +60,18 @@ void Runtime::setMessageBox(MessageBox handler) {
     messageBox_ = std::move(handler);
 }
 
-std::string Runtime::serialDevice(int port) const {
-    if (auto it = serialPorts_.find(port); it != serialPorts_.end()) return it->second;
+std::string Runtime::serialDevice(int port, const std::string& node) const {
+    if (!node.empty()) {
+        if (auto it = serialPorts_.find({UCase(node), port}); it != serialPorts_.end())
+            return it->second;
+    }
+    if (auto it = serialPorts_.find({std::string(), port}); it != serialPorts_.end())
+        return it->second;
     return "/dev/ttyS" + std::to_string(port - 1);
 }
 
-void Runtime::mapSerialPort(int port, std::string device) {
-    serialPorts_[port] = std::move(device);
+void Runtime::mapSerialPort(int port, std::string device, const std::string& node) {
+    serialPorts_[{UCase(node), port}] = std::move(device);
 }
 
 std::shared_ptr<nodeDB> Runtime::nodes() {

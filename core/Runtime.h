@@ -9,6 +9,8 @@
 #include "platform/Clock.h"
 #include "platform/EventLoop.h"
 #include "platform/FileSystem.h"
+#include "platform/LinkTrace.h"
+#include "platform/serial/SerialDevices.h"
 
 namespace maroset {
 
@@ -48,9 +50,18 @@ class Runtime {
     void MsgBox(const std::string& text);
     void setMessageBox(MessageBox handler);
 
-    // Serial port N is "/dev/ttyS<N-1>" unless mapped.
-    std::string serialDevice(int port) const;
-    void mapSerialPort(int port, std::string device);
+    // The device of serial port N as the node `node` sees it: a mapping for that node and
+    // port, else a mapping for the port, else "/dev/ttyS<N-1>". Node names match in any
+    // letter case, as the node collection's keys do. A mapping for one node lets a host run
+    // two serial drivers that both use port 1 on two adapters.
+    std::string serialDevice(int port, const std::string& node = {}) const;
+    // Maps port N to a device, for every node (node empty) or for one node.
+    void mapSerialPort(int port, std::string device, const std::string& node = {});
+    // Where serial ports open their devices (tests plug in-memory cables here).
+    platform::SerialDevices& serialDevices() { return serialDevices_; }
+
+    // The link trace drivers write to (off unless a host gives it a sink).
+    platform::LinkTrace& trace() { return trace_; }
 
     // The TCP port used for a coupler's Modbus port 502 (502 unless mapped, for simulators
     // and tests that run without privileges).
@@ -67,7 +78,10 @@ class Runtime {
     platform::FileSystem files_;
     MessageBox messageBox_;
     ErrorTrap trap_;
-    std::map<int, std::string> serialPorts_;
+    platform::SerialDevices serialDevices_;
+    platform::LinkTrace trace_;
+    // Keyed by upper-cased node name ("" for every node) and port.
+    std::map<std::pair<std::string, int>, std::string> serialPorts_;
     int modbusPort_ = 502;
     // Last, so they go first: drivers still use the loop while they shut down.
     std::shared_ptr<nodeDB> nodeDB_;

@@ -4,9 +4,9 @@
 #include <vector>
 
 #include "core/ClsNodeDBInterface.h"
-#include "core/Conversions.h"
 #include "core/Runtime.h"
 #include "core/nodeDB.h"
+#include "lang/Conversions.h"
 
 namespace maroset {
 

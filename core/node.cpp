@@ -1,23 +1,15 @@
 #include "core/node.h"
 
-#include <algorithm>
-#include <cctype>
-
-#include "core/Conversions.h"
 #include "core/DriverCatalog.h"
 #include "core/Procedure.h"
+#include "lang/Conversions.h"
+#include "lang/Strings.h"
 
 namespace maroset {
 
 namespace {
 
 constexpr const char* kModule = "node";
-
-std::string upperCase(std::string text) {
-    std::transform(text.begin(), text.end(), text.begin(),
-                   [](unsigned char c) { return static_cast<char>(std::toupper(c)); });
-    return text;
-}
 
 // The handle as a 16-bit integer, as AddItem and RemoveItem declare it (Overflow outside
 // -32768..32767, before the driver runs).
@@ -45,7 +37,7 @@ std::shared_ptr<Driver> node::requireDriver() const {
 void node::Init() {
     const auto self = weak_from_this().lock();
     Procedure proc(kModule, "Init");
-    proc.run([&] { driverType_ = upperCase(CStr(DriverName)); });
+    proc.run([&] { driverType_ = UCase(CStr(DriverName)); });
 
     // Each type gets its properties and startup in its own order; the orders are intended.
     auto create = [&](const char* cls) { proc.run([&] { driver_ = CreateDriver(cls); }); };

@@ -5,8 +5,8 @@
 #include <string>
 
 #include "core/Driver.h"
-#include "core/Variant.h"
-#include "core/VbArray.h"
+#include "lang/Variant.h"
+#include "lang/VbArray.h"
 
 namespace maroset {
 

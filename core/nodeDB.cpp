@@ -4,9 +4,9 @@
 #include <cctype>
 #include <utility>
 
-#include "core/Conversions.h"
 #include "core/Procedure.h"
 #include "core/Runtime.h"
+#include "lang/Conversions.h"
 #include "platform/Database.h"
 
 namespace maroset {

@@ -5,10 +5,10 @@
 #include <string>
 #include <vector>
 
-#include "core/Event.h"
-#include "core/Variant.h"
-#include "core/VbArray.h"
 #include "core/node.h"
+#include "lang/Event.h"
+#include "lang/Variant.h"
+#include "lang/VbArray.h"
 
 namespace maroset {
 

@@ -5,8 +5,30 @@
 
 namespace maroset {
 
+namespace {
+
+template <class T>
+std::shared_ptr<Driver> make() {
+    return std::make_shared<T>();
+}
+
+struct DriverClass {
+    std::string_view name;
+    std::shared_ptr<Driver> (*create)();
+};
+
+// Every driver class a node can create, by class name. A new driver family adds its row here.
+constexpr DriverClass kClasses[] = {
+    {"ClsDriverMemTag", make<ClsDriverMemTag>},
+    {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
+};
+
+}  // namespace
+
 std::shared_ptr<Driver> CreateDriver(std::string_view className) {
-    if (className == "ClsDriverDiskTag") return std::make_shared<ClsDriverDiskTag>();
+    for (const DriverClass& c : kClasses) {
+        if (c.name == className) return c.create();
+    }
     // Classes not built yet fall back to memory tags, as an unknown type key does.
     return std::make_shared<ClsDriverMemTag>();
 }

@@ -4,8 +4,8 @@
 #include <cstdint>
 #include <string>
 
-#include "core/Conversions.h"
-#include "core/Format.h"
+#include "lang/Conversions.h"
+#include "lang/Format.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     const maroset::Variant text(std::string(reinterpret_cast<const char*>(data), size));

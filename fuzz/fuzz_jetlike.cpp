@@ -3,7 +3,7 @@
 #include <cstdint>
 #include <string_view>
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 #include "platform/JetLike.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {

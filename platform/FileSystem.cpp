@@ -9,7 +9,7 @@
 #include <system_error>
 #include <vector>
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset::platform {
 

@@ -2,7 +2,7 @@
 
 #include <cstddef>
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset::platform {
 namespace {

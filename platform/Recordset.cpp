@@ -2,7 +2,7 @@
 
 #include <cmath>
 
-#include "core/Conversions.h"
+#include "lang/Conversions.h"
 #include "platform/SqliteConnection.h"
 
 namespace maroset::platform {

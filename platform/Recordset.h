@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 struct sqlite3_stmt;
 

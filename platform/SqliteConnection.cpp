@@ -2,7 +2,7 @@
 
 #include <optional>
 
-#include "core/Variant.h"
+#include "lang/Variant.h"
 #include "platform/JetLike.h"
 
 namespace maroset::platform {

@@ -8,12 +8,12 @@
 #include <string>
 #include <string_view>
 
-#include "core/Variant.h"
-#include "core/VbError.h"
+#include "lang/Variant.h"
+#include "lang/VbError.h"
 
 namespace maroset::platform {
 
-// Error numbers of the original database engine beyond those in core/VbError.h.
+// Error numbers of the original database engine beyond those in lang/VbError.h.
 namespace dberr {
 inline constexpr int32_t ReservedError = 3000;
 inline constexpr int32_t UpdateWithoutAddNewOrEdit = 3020;

@@ -1,6 +1,6 @@
 #include "platform/Timer.h"
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset::platform {
 
@@ -75,7 +75,7 @@ int32_t Timer::Interval() const {
 
 void Timer::Interval(int32_t ms) {
     // The timer control refuses a negative interval.
-    if (ms < 0) throw VbError(380, "Invalid property value");
+    if (ms < 0) throw VbError(err::InvalidPropertyValue);
     state_->interval = ms;
     if (state_->enabled) state_->arm(state_);
 }

@@ -3,7 +3,7 @@
 #include <cstdint>
 #include <memory>
 
-#include "core/Event.h"
+#include "lang/Event.h"
 #include "platform/EventLoop.h"
 
 namespace maroset::platform {

@@ -5,7 +5,7 @@
 #include <string>
 
 #include "core/Driver.h"
-#include "core/VbArray.h"
+#include "lang/VbArray.h"
 
 namespace maroset {
 

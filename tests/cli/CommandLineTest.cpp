@@ -19,13 +19,15 @@ TEST(CommandLineTest, MisuseExitsWithStatusTwoAndTheUsageOfTheCommand) {
     const Lines rows[] = {
         {}, {"frob"}, {"run"}, {"run", p, "extra"}, {"run", p, "--colour"},
         {"run", p, "--drive-root"}, {"run", p, "--com", "ttyUSB0"},
-        {"run", p, "--com", "0=/dev/ttyUSB0"}, {"run", p, "--modbus-port", "70000"},
+        {"run", p, "--com", "0=/dev/ttyUSB0"}, {"run", p, "--com", ":1=/dev/ttyUSB0"},
+        {"run", p, "--com", "Plc:x=/dev/ttyUSB0"}, {"run", p, "--modbus-port", "70000"},
         {"project"}, {"project", "frob"}, {"project", "init"}, {"project", "init", p, "more"},
         {"project", "list"}, {"project", "add", p, "OnlyName"},
         {"project", "add", p, "A", "MEMTAG", "--colour", "red"},
         {"project", "add", p, "A", "MEMTAG", "--update-rate", "fast"},
         {"project", "add", p, "A", "MEMTAG", "--port", "-1"},
-        {"demo", "--seconds", "0"}, {"demo", "--seconds", "ten"}, {"demo", "--seconds", "-3"}};
+        {"demo", "--seconds", "0"}, {"demo", "--seconds", "ten"}, {"demo", "--seconds", "-3"},
+        {"sim"}, {"sim", "frob"}};
     // clang-format on
     for (const auto& args : rows) {
         const auto r = RunCli(args);
@@ -42,6 +44,7 @@ TEST(CommandLineTest, EveryCommandHasHelpOnStandardOutput) {
     const std::pair<Lines, std::string> rows[] = {
         {{"--help"}, "run PROJECT"}, {{"run", "--help"}, "run PROJECT"},
         {{"project", "--help"}, "project init PATH"}, {{"demo", "--help"}, "demo"},
+        {{"sim", "--help"}, "sim KIND"},
         {{"project", "init", "--help"}, "project init PATH"},
         {{"project", "add", "-h"}, "project add PATH NAME DRIVER"},
         {{"project", "list", "x", "--help"}, "project list PATH"}};

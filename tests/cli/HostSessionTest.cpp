@@ -200,8 +200,9 @@ TEST_F(HostCommands, TrapLogsErrorsUnderTheDriveRootAndTheReplyIsOk) {
               (Lines{reply("load"), reply("add"), failure("write", 13), reply("quit")}));
     EXPECT_FALSE(std::filesystem::exists(driveRoot() / "MarosetErrors.txt"));
     // The port options are taken along.
-    EXPECT_EQ(memSession("write Mem seven 1\n", {"--json", "--trap", "--com", "1=/dev/null",
-                                                 "--com=2=/dev/zero", "--modbus-port", "1502"}),
+    EXPECT_EQ(memSession("write Mem seven 1\n",
+                         {"--json", "--trap", "--com", "1=/dev/null", "--com=Plc:2=/dev/zero",
+                          "--trace", "--modbus-port", "1502"}),
               (Lines{reply("load"), reply("add"), reply("write"), reply("quit")}));
     std::ifstream in(driveRoot() / "MarosetErrors.txt");
     const std::string log{std::istreambuf_iterator<char>(in), {}};

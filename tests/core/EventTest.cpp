@@ -1,4 +1,4 @@
-#include "core/Event.h"
+#include "lang/Event.h"
 
 #include <gtest/gtest.h>
 

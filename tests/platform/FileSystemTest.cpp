@@ -7,7 +7,7 @@
 #include <iterator>
 #include <string>
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 #include "support/ErrorOf.h"
 #include "support/TempDir.h"
 

@@ -2,7 +2,7 @@
 
 #include <cstdint>
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset::test {
 

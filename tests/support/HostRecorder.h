@@ -5,7 +5,7 @@
 #include <vector>
 
 #include "core/ClsNodeDBInterface.h"
-#include "core/Subscription.h"
+#include "lang/Subscription.h"
 
 namespace maroset::test {
 

@@ -1,6 +1,6 @@
 // Uses the installed library as a host would: one node, one write, one value change.
 #include <core/ClsNodeDBInterface.h>
-#include <core/Conversions.h>
+#include <lang/Conversions.h>
 
 #include <iostream>
 

@@ -1,4 +1,4 @@
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 #include <utility>
 
@@ -26,6 +26,8 @@ std::string ErrorDescription(int32_t number) {
             return "Object variable or With block variable not set";
         case err::InvalidUseOfNull:
             return "Invalid use of Null";
+        case err::InvalidPropertyValue:
+            return "Invalid property value";
         case err::SetNotSupportedAtRunTime:
             return "Set not supported at run time";
         case err::SetNotPermitted:

@@ -1,4 +1,4 @@
-#include "core/Format.h"
+#include "lang/Format.h"
 
 #include <gtest/gtest.h>
 

@@ -1,4 +1,4 @@
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 #include <gtest/gtest.h>
 

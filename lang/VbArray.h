@@ -4,7 +4,7 @@
 #include <utility>
 #include <vector>
 
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 namespace maroset {
 

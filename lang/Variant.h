@@ -7,8 +7,8 @@
 #include <string_view>
 #include <variant>
 
-#include "core/Object.h"
-#include "core/VbArray.h"
+#include "lang/Object.h"
+#include "lang/VbArray.h"
 
 namespace maroset {
 

@@ -1,10 +1,10 @@
-#include "core/Format.h"
+#include "lang/Format.h"
 
 #include <charconv>
 #include <cmath>
 #include <cstdlib>
 
-#include "core/Conversions.h"
+#include "lang/Conversions.h"
 
 namespace maroset {
 

@@ -5,7 +5,7 @@
 #include <memory>
 #include <vector>
 
-#include "core/Subscription.h"
+#include "lang/Subscription.h"
 
 namespace maroset {
 

@@ -1,4 +1,4 @@
-#include "core/VbArray.h"
+#include "lang/VbArray.h"
 
 #include <gtest/gtest.h>
 

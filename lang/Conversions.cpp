@@ -1,4 +1,4 @@
-#include "core/Conversions.h"
+#include "lang/Conversions.h"
 
 #include <charconv>
 #include <cmath>

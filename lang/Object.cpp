@@ -1,6 +1,6 @@
-#include "core/Object.h"
+#include "lang/Object.h"
 
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 namespace maroset {
 

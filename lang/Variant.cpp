@@ -1,9 +1,9 @@
-#include "core/Variant.h"
+#include "lang/Variant.h"
 
 #include <cstdio>
 #include <ostream>
 
-#include "core/Conversions.h"
+#include "lang/Conversions.h"
 
 namespace maroset {
 

@@ -1,4 +1,4 @@
-#include "core/VbError.h"
+#include "lang/VbError.h"
 
 #include <gtest/gtest.h>
 
