@@ -6,6 +6,7 @@
 #include <system_error>
 
 #include "cli/CommandLine.h"
+#include "cli/Df1Station.h"
 #include "cli/DiskTagStation.h"
 #include "cli/EventPrinter.h"
 #include "cli/MemoryTagStation.h"
@@ -58,6 +59,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     std::vector<std::unique_ptr<DemoStation>> stations;
     stations.push_back(std::make_unique<MemoryTagStation>());
     stations.push_back(std::make_unique<DiskTagStation>());
+    stations.push_back(std::make_unique<Df1Station>());
     return stations;
 }
 

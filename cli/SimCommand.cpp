@@ -11,6 +11,7 @@
 #include "cli/UsageError.h"
 #include "core/Runtime.h"
 #include "lang/VbError.h"
+#include "sim/df1/Df1Simulator.h"
 
 namespace maroset::cli {
 
@@ -22,7 +23,29 @@ const char* const SimCommand::Usage =
     "tells the options of one kind.\n";
 
 const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
-    static const std::vector<Kind> kinds = {};
+    static const std::vector<Kind> kinds = {
+        {"df1",
+         "DF1 PLC (Allen-Bradley, DF1 full duplex, 19200,n,8,1)",
+         "usage: maroset sim df1 [--drift MS]\n"
+         "\n"
+         "Runs a simulated Allen-Bradley PLC on a new pseudo-terminal and prints its path.\n"
+         "It answers DF1 full-duplex typed reads and writes (CMD 0x0F, FNC 0xA2/0xAA) on its\n"
+         "data files B3 T4 C5 R6 N7 F8 N9 N10 (256 words each). N7:0 counts up, N7:1 ramps\n"
+         "and N7:2 runs through values holding the byte 0x10, every MS ms. Commands on\n"
+         "standard input set words and inject faults (NAK, silence, bad CRC, a pause in a\n"
+         "reply, ENQ); type help.\n"
+         "\n"
+         "Options:\n"
+         "  --drift MS   how often N7:0-2 change (default 1000; 0: never)\n",
+         {{"drift", true}},
+         [](const CommandLine& options) -> std::unique_ptr<sim::Simulator> {
+             auto plc = sim::Df1Simulator::OnPseudoTerminal(Runtime::current().loop());
+             plc->drift(options.integer("drift", 0, 3600000).value_or(1000));
+             return plc;
+         },
+         "Point a host at it: maroset run PROJECT --com 1={}\n"
+         "(a node with Driver NUVABDF1; tags N7:0, N7:1, ...)"},
+    };
     return kinds;
 }
 

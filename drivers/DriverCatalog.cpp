@@ -1,5 +1,6 @@
 #include "core/DriverCatalog.h"
 
+#include "drivers/df1/ClsDriverNuvAbDf1.h"
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
 
@@ -21,6 +22,7 @@ struct DriverClass {
 constexpr DriverClass kClasses[] = {
     {"ClsDriverMemTag", make<ClsDriverMemTag>},
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
+    {"ClsDriverNuvAbDf1", make<ClsDriverNuvAbDf1>},
 };
 
 }  // namespace

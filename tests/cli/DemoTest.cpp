@@ -13,9 +13,11 @@ namespace {
 TEST(DemoTest, ShowsValueChangesOfEveryStationAndCleansUp) {
     const auto r = RunCli({"demo", "--seconds", "2", "--json"});
     ASSERT_EQ(r.status, 0) << r.errors;
-    // Events only on standard output; the disk tag is read back first, then counts.
+    // Events only on standard output; the disk tag is read back first, then counts. A PLC's
+    // poll reports all its changed tags in one event.
     const std::string event = "{\"event\":\"ValueChange\",\"count\":1,";
-    for (const auto& line : r.lines) EXPECT_EQ(line.rfind(event, 0), 0u) << line;
+    for (const auto& line : r.lines)
+        EXPECT_EQ(line.rfind("{\"event\":\"ValueChange\",\"count\":", 0), 0u) << line;
     for (const std::string seen :
          {"\"handles\":[1],\"values\":[20]}", "\"handles\":[11],\"values\":[\"0\"]}",
           "\"handles\":[11],\"values\":[1]}"})
