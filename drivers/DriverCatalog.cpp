@@ -2,6 +2,7 @@
 
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
+#include "drivers/opc/ClsDriverOPC.h"
 
 namespace maroset {
 
@@ -21,6 +22,7 @@ struct DriverClass {
 constexpr DriverClass kClasses[] = {
     {"ClsDriverMemTag", make<ClsDriverMemTag>},
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
+    {"ClsDriverOPC", make<ClsDriverOPC>},
 };
 
 }  // namespace
