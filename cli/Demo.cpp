@@ -9,6 +9,7 @@
 #include "cli/DiskTagStation.h"
 #include "cli/EventPrinter.h"
 #include "cli/MemoryTagStation.h"
+#include "cli/OpcStation.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/StopSignal.h"
 #include "cli/UsageError.h"
@@ -58,6 +59,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     std::vector<std::unique_ptr<DemoStation>> stations;
     stations.push_back(std::make_unique<MemoryTagStation>());
     stations.push_back(std::make_unique<DiskTagStation>());
+    stations.push_back(std::make_unique<OpcStation>());
     return stations;
 }
 
