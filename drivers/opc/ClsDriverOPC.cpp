@@ -1,5 +1,7 @@
 #include "drivers/opc/ClsDriverOPC.h"
 
+#include <cstdint>
+
 #include "core/ClsNodeDBInterface.h"
 #include "core/EventProcedure.h"
 #include "core/Procedure.h"
@@ -36,7 +38,9 @@ std::string joinText(const Variant& v) {
 
 // The value report of an event: the server's arrays as they came, with its count.
 void NewValue(VbArray<int32_t>& handles, int32_t numItems, VbArray<Variant>& values) {
-    const int16_t count = CInt(Variant(numItems));
+    // The count goes up as a 16-bit integer: Overflow beyond, as CInt would say.
+    if (numItems < INT16_MIN || numItems > INT16_MAX) throw VbError(err::Overflow);
+    const auto count = static_cast<int16_t>(numItems);
     if (auto db = Runtime::current().hiddenInterface().nodeDB())
         db->NewValue(handles, count, values);
 }

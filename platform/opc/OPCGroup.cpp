@@ -91,28 +91,32 @@ void OPCGroup::update() {
     if (!connection_ || !active_ || !subscribed_) return;
     // A handler may release the group: it lives until this tick is over.
     const auto self = shared_from_this();
-    std::vector<int32_t> handles;
-    std::vector<Variant> values;
-    std::vector<int32_t> qualities;
-    std::vector<DateTime> stamps;
+    changed_.clear();
+    changedAt_.clear();
     items_.forEach([&](OPCItems::Entry& e) {
         OpcItemState state = e.source->Read();
         if (e.reported && state.quality == e.lastQuality && state.value == e.lastValue) return;
         e.reported = true;
         e.lastQuality = state.quality;
-        e.lastValue = state.value;
-        handles.push_back(e.clientHandle);
-        values.push_back(std::move(state.value));
-        qualities.push_back(state.quality);
-        stamps.push_back(state.timeStamp);
+        e.lastValue = std::move(state.value);
+        changed_.push_back(&e);
+        changedAt_.push_back(state.timeStamp);
     });
-    if (handles.empty()) return;
-    const auto count = static_cast<int32_t>(handles.size());
-    VbArray<int32_t> ClientHandles(1, std::move(handles));
-    VbArray<Variant> ItemValues(1, std::move(values));
-    VbArray<int32_t> Qualities(1, std::move(qualities));
-    VbArray<DateTime> TimeStamps(1, std::move(stamps));
-    DataChange.raise(0, count, ClientHandles, ItemValues, Qualities, TimeStamps);
+    if (changed_.empty()) return;
+    const auto count = static_cast<int32_t>(changed_.size());
+    clientHandles_.ReDim(1, count);
+    itemValues_.ReDim(1, count);
+    qualities_.ReDim(1, count);
+    timeStamps_.ReDim(1, count);
+    for (int32_t i = 1; i <= count; ++i) {
+        const OPCItems::Entry& e = *changed_[static_cast<size_t>(i - 1)];
+        clientHandles_(i) = e.clientHandle;
+        itemValues_(i) = e.lastValue;
+        qualities_(i) = e.lastQuality;
+        timeStamps_(i) = changedAt_[static_cast<size_t>(i - 1)];
+    }
+    changed_.clear();  // the handlers may add or remove items
+    DataChange.raise(0, count, clientHandles_, itemValues_, qualities_, timeStamps_);
 }
 
 void OPCGroup::AsyncRead(int32_t NumItems, const VbArray<int32_t>& ServerHandles,

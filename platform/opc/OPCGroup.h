@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "lang/Event.h"
 #include "lang/Subscription.h"
@@ -108,6 +109,14 @@ class OPCGroup : public std::enable_shared_from_this<OPCGroup> {
     Timer timer_;
     Subscription tick_;
     int32_t nextCancelID_ = 1;
+    // The data change being built, kept from one update to the next so that an update does
+    // not allocate. An update is never re-entered (the timer sees to that).
+    std::vector<OPCItems::Entry*> changed_;
+    std::vector<DateTime> changedAt_;
+    VbArray<int32_t> clientHandles_;
+    VbArray<Variant> itemValues_;
+    VbArray<int32_t> qualities_;
+    VbArray<DateTime> timeStamps_;
 };
 
 }  // namespace maroset::platform
