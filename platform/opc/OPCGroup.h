@@ -24,8 +24,9 @@ struct OpcConnection;
 // - DataChange(TransactionID, NumItems, ClientHandles, ItemValues, Qualities, TimeStamps):
 //   while the group is active and subscribed, once every UpdateRate milliseconds that some
 //   item changed (value or quality) since the group last reported it, holding exactly those
-//   items in the order they were added. The first one after activation, and the first one
-//   after an item is added, report those items whatever their values. TransactionID 0.
+//   items in the order they were added. The first one after activation holds every item,
+//   and an item added since the last one is in the next one, whatever the values.
+//   TransactionID 0.
 // - AsyncReadComplete(TransactionID, NumItems, ClientHandles, ItemValues, Qualities,
 //   TimeStamps, Errors): the answer to AsyncRead, at the next turn of the loop, with the
 //   values of that moment, whether the group is active or not.

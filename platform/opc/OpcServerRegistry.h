@@ -38,7 +38,8 @@ class OpcServerRegistry {
     bool Unregister(const std::string& progID);
     // The server of an identifier; null when none is registered.
     std::shared_ptr<OpcServerBackend> Find(const std::string& progID) const;
-    // Every registered identifier, as registered, in alphabetical order.
+    // Every registered identifier as it was registered, ordered by identifier (letter case
+    // ignored).
     std::vector<std::string> ProgIDs() const;
 
     EventLoop& loop() const { return loop_; }
