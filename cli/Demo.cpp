@@ -10,6 +10,7 @@
 #include "cli/DiskTagStation.h"
 #include "cli/EventPrinter.h"
 #include "cli/MemoryTagStation.h"
+#include "cli/OpcStation.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/StopSignal.h"
 #include "cli/UsageError.h"
@@ -60,6 +61,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     stations.push_back(std::make_unique<MemoryTagStation>());
     stations.push_back(std::make_unique<DiskTagStation>());
     stations.push_back(std::make_unique<Df1Station>());
+    stations.push_back(std::make_unique<OpcStation>());
     return stations;
 }
 

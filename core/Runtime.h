@@ -10,6 +10,7 @@
 #include "platform/EventLoop.h"
 #include "platform/FileSystem.h"
 #include "platform/LinkTrace.h"
+#include "platform/opc/OpcServerRegistry.h"
 #include "platform/serial/SerialDevices.h"
 
 namespace maroset {
@@ -68,6 +69,10 @@ class Runtime {
     int modbusPort() const { return modbusPort_; }
     void setModbusPort(int port) { modbusPort_ = port; }
 
+    // The OPC servers that OPCServer.Connect finds by program identifier (the built-in
+    // simulated server; hosts and tests register others).
+    platform::OpcServerRegistry& opcServers() { return opcServers_; }
+
     // The process-wide nodeDB and hidden façade, created on first use.
     std::shared_ptr<nodeDB> nodes();
     ClsNodeDBInterface& hiddenInterface();
@@ -83,6 +88,7 @@ class Runtime {
     // Keyed by upper-cased node name ("" for every node) and port.
     std::map<std::pair<std::string, int>, std::string> serialPorts_;
     int modbusPort_ = 502;
+    platform::OpcServerRegistry opcServers_{*loop_, *clock_};
     // Last, so they go first: drivers still use the loop while they shut down.
     std::shared_ptr<nodeDB> nodeDB_;
     std::unique_ptr<ClsNodeDBInterface> hidden_;

@@ -3,6 +3,7 @@
 #include "drivers/df1/ClsDriverNuvAbDf1.h"
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
+#include "drivers/opc/ClsDriverOPC.h"
 
 namespace maroset {
 
@@ -23,6 +24,7 @@ constexpr DriverClass kClasses[] = {
     {"ClsDriverMemTag", make<ClsDriverMemTag>},
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
     {"ClsDriverNuvAbDf1", make<ClsDriverNuvAbDf1>},
+    {"ClsDriverOPC", make<ClsDriverOPC>},
 };
 
 }  // namespace

@@ -108,6 +108,8 @@ int LoopCore::pollWatches(int timeoutMs, const bool* stop) {
         fds.push_back(pollfd{w->fd, w->events, 0});
         ready.push_back(w);
     }
+    // Nothing to watch and no time to wait: the system call would only cost time.
+    if (fds.empty() && timeoutMs == 0) return 0;
     const int n = ::poll(fds.empty() ? nullptr : fds.data(), fds.size(), timeoutMs);
     if (n < 0) {
         if (errno == EINTR || errno == EAGAIN) return 0;

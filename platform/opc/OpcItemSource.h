@@ -1,0 +1,34 @@
+#pragma once
+
+#include <cstdint>
+
+#include "lang/Variant.h"
+#include "platform/Clock.h"
+
+namespace maroset::platform {
+
+// What a server knows of one item at a moment: its value, the quality word (192 good) and the
+// time the value was taken.
+struct OpcItemState {
+    Variant value;
+    int32_t quality = 0;
+    DateTime timeStamp{};
+};
+
+// One item of a server's address space, as one group of one client holds it (what
+// OpcServerBackend::AddItem hands out). Called only on the loop's thread.
+class OpcItemSource {
+  public:
+    virtual ~OpcItemSource() = default;
+
+    // The item's current state, as the server's cache has it.
+    virtual OpcItemState Read() = 0;
+    // Whether the item's access rights allow writing; AsyncWrite refuses the write with
+    // OPC_E_BADRIGHTS before anything is sent when they do not.
+    virtual bool Writable() const = 0;
+    // Writes a value to the item; the result code of the write (S_OK, OPC_E_BADTYPE,
+    // OPC_E_RANGE, ...).
+    virtual int32_t Write(const Variant& value) = 0;
+};
+
+}  // namespace maroset::platform
