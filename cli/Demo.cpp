@@ -8,6 +8,7 @@
 #include "cli/CommandLine.h"
 #include "cli/DiskTagStation.h"
 #include "cli/EventPrinter.h"
+#include "cli/IntechStation.h"
 #include "cli/MemoryTagStation.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/StopSignal.h"
@@ -58,6 +59,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     std::vector<std::unique_ptr<DemoStation>> stations;
     stations.push_back(std::make_unique<MemoryTagStation>());
     stations.push_back(std::make_unique<DiskTagStation>());
+    stations.push_back(std::make_unique<IntechStation>());
     return stations;
 }
 

@@ -1,5 +1,6 @@
 #include "core/DriverCatalog.h"
 
+#include "drivers/intech/ClsDriverIntech.h"
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
 
@@ -21,6 +22,7 @@ struct DriverClass {
 constexpr DriverClass kClasses[] = {
     {"ClsDriverMemTag", make<ClsDriverMemTag>},
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
+    {"ClsDriverIntech", make<ClsDriverIntech>},
 };
 
 }  // namespace
