@@ -13,12 +13,13 @@ namespace {
 
 constexpr const char* kNode = "Meter";
 
+// One tag per reply, so that each value change reports one value.
 struct DemoTag {
     int32_t handle;
     const char* address;
 };
 constexpr DemoTag kTags[] = {
-    {31, "01LAI1"}, {32, "01LAI6"}, {33, "01EAI17"}, {34, "01LDI1"}, {35, "01LDO1"},
+    {31, "01LAI1"}, {32, "01LAI6"}, {33, "01EAI17"}, {34, "02LDI1"}, {35, "01LDO1"},
 };
 
 }  // namespace
@@ -36,7 +37,7 @@ void IntechStation::addNodes(const std::filesystem::path& project) {
 
 void IntechStation::startSimulator() {
     Runtime& rt = Runtime::current();
-    simulator_ = sim::IntechSimulator::OnPseudoTerminal(rt.loop(), {"01"});
+    simulator_ = sim::IntechSimulator::OnPseudoTerminal(rt.loop(), {"01", "02"});
     simulator_->setDrift(1000);
     // Port 1 is this node's only: another serial node keeps its own mapping.
     rt.mapSerialPort(1, simulator_->endpoint(), kNode);

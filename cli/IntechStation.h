@@ -11,9 +11,10 @@ class IntechSimulator;
 namespace maroset::cli {
 
 // An Intech instrument (NUVINTECH): node "Meter", polled every 500 ms on port 1, which the
-// station maps for this node only to a pseudo-terminal where the instrument simulator (station
-// "01") answers. Analog, extended analog and digital values drift in the simulator; every
-// third second the host switches output LDO1, which comes back with the digital status.
+// station maps for this node only to a pseudo-terminal where two instruments of the simulator
+// (stations "01" and "02") answer. Analog, extended analog and digital values drift in the
+// simulator; every third second the host switches output LDO1, which comes back with the digital
+// status.
 class IntechStation : public DemoStation {
   public:
     static constexpr int32_t FirstHandle = 31;

@@ -70,8 +70,10 @@ void IntechInstrument::drift(int32_t step) {
         const uint16_t v = extended_[static_cast<size_t>(p - 1)];
         extended_[static_cast<size_t>(p - 1)] = static_cast<uint16_t>((v + 7 + p % 5) & 0x0FFF);
     }
-    // One input changes every other step.
-    if (step % 2 == 0) inputs_ ^= 1 << ((step / 2) % InputPoints);
+    // Input 1 changes every other step, the others less often.
+    constexpr int periods[InputPoints] = {2, 3, 5, 7};
+    for (int i = 0; i < InputPoints; ++i)
+        if (step % periods[i] == 0) inputs_ ^= 1 << i;
 }
 
 }  // namespace maroset::sim
