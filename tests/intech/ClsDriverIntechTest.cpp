@@ -36,7 +36,8 @@ class IntechDriver : public test::RuntimeFixture {
     FrmNUVIntech& line() { return *driver().NUVIntech(); }
     std::vector<std::string> pollList() {
         std::vector<std::string> out;
-        for (int32_t i = 0; i <= line().PollCommandUBound(); ++i) out.push_back(line().PollCommand(i));
+        for (int32_t i = 0; i <= line().PollCommandUBound(); ++i)
+            out.push_back(line().PollCommand(i));
         return out;
     }
     // The host's reports since the last call, as (handle, value) pairs, in order.
@@ -45,7 +46,8 @@ class IntechDriver : public test::RuntimeFixture {
         for (const auto& c : recorder.changes) {
             EXPECT_EQ(c.handlesLower, 1);
             EXPECT_EQ(c.count, static_cast<int16_t>(c.handles.size()));
-            for (size_t i = 0; i < c.handles.size(); ++i) out.emplace_back(c.handles[i], c.values[i]);
+            for (size_t i = 0; i < c.handles.size(); ++i)
+                out.emplace_back(c.handles[i], c.values[i]);
         }
         recorder.changes.clear();
         return out;
@@ -101,8 +103,7 @@ TEST_F(IntechDriver, TagsOfOneGroupShareACommandAndTheSearchLeavesAnEmptyEntry) 
     EXPECT_TRUE(driver().TagNames()(5).isEmpty()) << "the top entry stays empty";
     EXPECT_EQ(driver().TagHandles()(4), 3);
     m->AddTag(10, "02EAI33");
-    EXPECT_EQ(pollList(),
-              (std::vector<std::string>{"@01EX E5 00:", "@01EX DI:", "@02EX E3:"}));
+    EXPECT_EQ(pollList(), (std::vector<std::string>{"@01EX E5 00:", "@01EX DI:", "@02EX E3:"}));
     EXPECT_EQ(test::errorOf([&] { m->AddTag(11, "01LAIx"); }), 13);
     EXPECT_EQ(driver().TagCount(), 5) << "a failed range test stores nothing";
 
@@ -165,9 +166,10 @@ TEST_F(IntechDriver, WritesSendTheOutputCommandForAnyTagAndAnAcknowledgementCont
     m->WriteTag("6", Variant(0.5));
     m->WriteTag("7", Variant(int16_t{1}));
     m->WriteTag("99", Variant(int16_t{1}));
-    EXPECT_EQ(cable.takeHostSent(), "@02EX DO 0010.5 0000:10\r"
-                                    "@EX DO 0011 0000:4C\r"
-                                    "@EX DO 0011 0000:4C\r");
+    EXPECT_EQ(cable.takeHostSent(),
+              "@02EX DO 0010.5 0000:10\r"
+              "@EX DO 0011 0000:4C\r"
+              "@EX DO 0011 0000:4C\r");
     EXPECT_EQ(test::errorOf([&] { m->WriteTag("5", Variant::Null()); }), 94);
     advance(0ms);  // the instrument answers ER to 0.5 and ignores the empty address
 

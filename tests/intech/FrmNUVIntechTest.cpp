@@ -184,14 +184,14 @@ TEST_F(IntechReplies, DigitalStatusGivesOutputsThenInputsAsTheMaskedBits) {
     frm->RXData(WithBcc("@01EX DI 0003 0015:"));
     ASSERT_EQ(reads.size(), 1u);
     EXPECT_EQ(reads[0].namesUBound, 5);
-    EXPECT_EQ(reads[0].names, (std::vector<Variant>{"01LDO1", "01LDO2", "01LDI1", "01LDI2",
-                                                    "01LDI3", "01LDI4"}));
-    EXPECT_EQ(reads[0].values, (std::vector<Variant>{int16_t(1), int16_t(2), int16_t(1),
-                                                     int16_t(2), int16_t(4), int16_t(8)}));
+    EXPECT_EQ(reads[0].names,
+              (std::vector<Variant>{"01LDO1", "01LDO2", "01LDI1", "01LDI2", "01LDI3", "01LDI4"}));
+    EXPECT_EQ(reads[0].values, (std::vector<Variant>{int16_t(1), int16_t(2), int16_t(1), int16_t(2),
+                                                     int16_t(4), int16_t(8)}));
     frm->RXData(WithBcc("@07EX DI 0002 0010:"));
     EXPECT_EQ(reads[1].names[0], Variant("07LDO1"));
-    EXPECT_EQ(reads[1].values, (std::vector<Variant>{int16_t(0), int16_t(2), int16_t(0),
-                                                     int16_t(2), int16_t(0), int16_t(8)}));
+    EXPECT_EQ(reads[1].values, (std::vector<Variant>{int16_t(0), int16_t(2), int16_t(0), int16_t(2),
+                                                     int16_t(0), int16_t(8)}));
 }
 
 TEST_F(IntechReplies, ExtendedBlocksGiveSixteenWholeNumbersFromTheirBlocksBase) {
@@ -204,12 +204,12 @@ TEST_F(IntechReplies, ExtendedBlocksGiveSixteenWholeNumbersFromTheirBlocksBase) 
     EXPECT_EQ(reads[0].valuesUBound, 15);
     EXPECT_EQ(reads[0].names.front(), Variant("01EAI17"));
     EXPECT_EQ(reads[0].names.back(), Variant("01EAI32"));
-    const std::vector<Variant> expected = {"1023", "0",    "1", "4095", "2748", "16",
-                                           "256",  "2047", "2048", "2",  "3",    "4",
-                                           "5",    "6",    "7", "8"};
+    const std::vector<Variant> expected = {"1023", "0", "1", "4095", "2748", "16", "256", "2047",
+                                           "2048", "2", "3", "4",    "5",    "6",  "7",   "8"};
     EXPECT_EQ(reads[0].values, expected);
 
-    frm->RXData(WithBcc("@02EX E4 001 002 003 004 005 006 007 008 009 00A 00B 00C 00D 00E 00F 010:"));
+    frm->RXData(
+        WithBcc("@02EX E4 001 002 003 004 005 006 007 008 009 00A 00B 00C 00D 00E 00F 010:"));
     EXPECT_EQ(reads[1].names.front(), Variant("02EAI49"));
     EXPECT_EQ(reads[1].names.back(), Variant("02EAI64"));
     EXPECT_EQ(reads[1].values.back(), Variant("16"));
