@@ -35,15 +35,13 @@ TEST(IntechOverPseudoTerminal, ANodePollsTheInstrumentsAndWritesItsOutput) {
     meter->AddTag(2, "02EAI64");
     db.StartScanning();
 
-    auto seen = [&](int32_t handle, const Variant& value) {
-        for (const auto& c : recorder.changes)
-            for (size_t i = 0; i < c.handles.size(); ++i)
-                if (c.handles[i] == handle && c.values[i] == value) return true;
-        return false;
-    };
+    // Waits up to 2 s for the value to reach the host.
     auto waitFor = [&](int32_t handle, const Variant& value) {
-        for (int i = 0; i < 100 && !seen(handle, value); ++i) rt->loop().runFor(20ms);
-        return seen(handle, value);
+        for (int i = 0; i < 100; ++i, rt->loop().runFor(20ms))
+            for (const auto& c : recorder.changes)
+                for (size_t k = 0; k < c.handles.size(); ++k)
+                    if (c.handles[k] == handle && c.values[k] == value) return true;
+        return false;
     };
     EXPECT_TRUE(waitFor(2, Variant("4095")));
     EXPECT_TRUE(waitFor(1, Variant(int16_t{0})));
