@@ -96,7 +96,11 @@ int32_t ClsDriverIntech::WriteItem(int32_t ClientHandle, const Variant& value) {
         // The point number does not change the command: output "001" is always written.
         if (name.size() > 5) address = Left(name, 2);
     });
-    proc.run([&] { owner().SendCommand("@" + address + "EX DO 001" + CStr(value) + " 0000:"); });
+    proc.run([&] {
+        // Joined as text is joined: Null adds nothing.
+        const std::string text = value.isNull() ? std::string() : CStr(value);
+        owner().SendCommand("@" + address + "EX DO 001" + text + " 0000:");
+    });
     return 0;
 }
 

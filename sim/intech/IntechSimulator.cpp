@@ -331,6 +331,7 @@ std::string IntechSimulator::command(std::string_view line) {
             if (f->fault == Fault::None) return "fault none";
             return std::string("fault ") + f->name +
                    (count == Always ? " on every reply"
+                    : count == 1    ? " on the next reply"
                                     : " on the next " + std::to_string(count) + " replies");
         }
         if ((verb == "set" && w.size() == 3) || (verb == "get" && w.size() == 2)) {

@@ -146,7 +146,10 @@ TEST_F(IntechDriver, WritesSendTheOutputCommandForAnyTagAndAnAcknowledgementCont
     m->WriteTag("99", Variant(int16_t{1}));
     EXPECT_EQ(cable.takeHostSent(),
               "@02EX DO 0010.5 0000:10\r@EX DO 0011 0000:4C\r@EX DO 0011 0000:4C\r");
-    EXPECT_EQ(test::errorOf([&] { m->WriteTag("5", Variant::Null()); }), 94);
+    m->WriteTag("5", Variant::Null());
+    m->WriteTag("5", Variant(true));
+    EXPECT_EQ(cable.takeHostSent(), "@01EX DO 001 0000:7C\r@01EX DO 001True 0000:1C\r");
+    EXPECT_EQ(test::errorOf([&] { m->WriteTag("5", Variant(VbArray<Variant>(0, 1))); }), 13);
     advance(0ms);
 
     // In the middle of a cycle the write's OK sends the next poll command.
