@@ -9,6 +9,7 @@
 #include "cli/Df1Station.h"
 #include "cli/DiskTagStation.h"
 #include "cli/EventPrinter.h"
+#include "cli/IntechStation.h"
 #include "cli/MemoryTagStation.h"
 #include "cli/OpcStation.h"
 #include "cli/ProjectDatabase.h"
@@ -62,6 +63,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     stations.push_back(std::make_unique<DiskTagStation>());
     stations.push_back(std::make_unique<Df1Station>());
     stations.push_back(std::make_unique<OpcStation>());
+    stations.push_back(std::make_unique<IntechStation>());
     return stations;
 }
 

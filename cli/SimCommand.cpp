@@ -12,6 +12,7 @@
 #include "core/Runtime.h"
 #include "lang/VbError.h"
 #include "sim/df1/Df1Simulator.h"
+#include "sim/intech/IntechSimulator.h"
 
 namespace maroset::cli {
 
@@ -21,6 +22,29 @@ const char* const SimCommand::Usage =
     "Runs one device simulator on its own until Ctrl-C, prints where it listens, and reads\n"
     "fault and data commands from standard input (type help). `maroset sim KIND --help`\n"
     "tells the options of one kind.\n";
+
+namespace {
+
+// `maroset sim intech`: instruments at the given station addresses on a new pseudo-terminal.
+std::unique_ptr<sim::Simulator> StartIntech(const CommandLine& options) {
+    std::vector<std::string> addresses;
+    const std::string list = options.value("stations").value_or("01");
+    for (size_t at = 0; at <= list.size();) {
+        const size_t comma = std::min(list.find(',', at), list.size());
+        addresses.push_back(list.substr(at, comma - at));
+        at = comma + 1;
+    }
+    try {
+        auto simulator =
+            sim::IntechSimulator::OnPseudoTerminal(Runtime::current().loop(), addresses);
+        simulator->setDrift(1000);
+        return simulator;
+    } catch (const std::invalid_argument& e) {
+        throw UsageError(e.what());
+    }
+}
+
+}  // namespace
 
 const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
     static const std::vector<Kind> kinds = {
@@ -45,6 +69,24 @@ const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
          },
          "Point a host at it: maroset run PROJECT --com 1={}\n"
          "(a node with Driver NUVABDF1; tags N7:0, N7:1, ...)"},
+        {"intech",
+         "Intech instruments on a serial line (\"@\" ASCII protocol)",
+         "usage: maroset sim intech [--stations LIST]\n"
+         "\n"
+         "Runs Intech instruments on a new pseudo-terminal and prints its path. They answer the\n"
+         "analog (EX E5 0g:), extended analog (EX E1: .. EX E4:) and digital status (EX DI:)\n"
+         "reads and the output write (EX DO ...); their values drift once a second.\n"
+         "\n"
+         "Options:\n"
+         "  --stations LIST   station addresses, two characters each, separated by commas\n"
+         "                    (default 01)\n"
+         "\n"
+         "Commands on standard input: set TAG VALUE, get TAG, fault KIND [N], fault none,\n"
+         "drift on|off|MS, status, help.\n",
+         {{"stations", true}},
+         StartIntech,
+         "Connect a host: maroset run PROJECT --com 1={}\n(NUVINTECH nodes use port 1; --com "
+         "NODE:1=PATH maps it for one node only)"},
     };
     return kinds;
 }

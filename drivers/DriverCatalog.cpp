@@ -1,6 +1,7 @@
 #include "core/DriverCatalog.h"
 
 #include "drivers/df1/ClsDriverNuvAbDf1.h"
+#include "drivers/intech/ClsDriverIntech.h"
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
 #include "drivers/opc/ClsDriverOPC.h"
@@ -25,6 +26,7 @@ constexpr DriverClass kClasses[] = {
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
     {"ClsDriverNuvAbDf1", make<ClsDriverNuvAbDf1>},
     {"ClsDriverOPC", make<ClsDriverOPC>},
+    {"ClsDriverIntech", make<ClsDriverIntech>},
 };
 
 }  // namespace

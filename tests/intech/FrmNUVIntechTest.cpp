@@ -1,0 +1,181 @@
+#include "drivers/intech/FrmNUVIntech.h"
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "IntechFrames.h"
+#include "platform/serial/MemorySerialCable.h"
+#include "support/ErrorOf.h"
+#include "support/RuntimeFixture.h"
+
+namespace maroset {
+namespace {
+
+using namespace std::chrono_literals;
+using test::WithBcc;
+
+// One line owner of node "Meter" ticking every 100 ms, an in-memory cable at /dev/ttyS0 whose
+// device end the test speaks through, and the link trace recorded.
+class IntechLine : public test::RuntimeFixture {
+  protected:
+    IntechLine() {
+        runtime().serialDevices().plug("/dev/ttyS0", cable.hostEnd());
+        runtime().trace().setSink([this](std::string_view l) { trace.emplace_back(l); });
+        frm->NodeName("Meter");
+        frm->TmrScanRate.Interval(100);
+        reads_ = frm->ReadComplete.subscribe([this](VbArray<Variant>& n, VbArray<Variant>& v) {
+            EXPECT_EQ(n.LBound(), 0);
+            EXPECT_EQ(n.UBound(), v.UBound());
+            names.push_back(n.items());
+            values.push_back(v.items());
+        });
+    }
+    void poll(const std::vector<std::string>& commands) {
+        for (size_t i = 0; i < commands.size(); ++i)
+            frm->PollCommand(static_cast<int32_t>(i), commands[i]);
+        frm->TmrScanRate.Enabled(true);
+    }
+    std::string sent() {
+        advance(0ms);
+        return cable.takeHostSent();
+    }
+    void answer(const std::string& bytes) {
+        cable.deviceEnd()->write(bytes);
+        advance(0ms);
+    }
+    bool traced(std::string_view part) const {
+        for (const auto& l : trace)
+            if (l.find(part) != std::string::npos) return true;
+        return false;
+    }
+
+    platform::MemorySerialCable cable{loop()};
+    std::shared_ptr<FrmNUVIntech> frm = std::make_shared<FrmNUVIntech>();
+    std::vector<std::vector<Variant>> names, values;
+    std::vector<std::string> trace;
+    const std::string ok = WithBcc("@01OK:") + "\r";
+
+  private:
+    Subscription reads_;
+};
+
+TEST_F(IntechLine, OneTickWalksTheListUntilItWrapsAndAnythingButAGoodReplyEndsTheChain) {
+    poll({"@01EX E5 00:", "@01EX DI:", "@02EX E1:"});
+    EXPECT_FALSE(frm->MSComm1.PortOpen()) << "the port opens on the first send";
+    advance(100ms);
+    EXPECT_EQ(sent(), "@01EX E5 00:52\r");
+    answer(WithBcc("@01EX E6 123:") + "\r");  // a block it does not report still goes on
+    EXPECT_EQ(sent(), "@01EX DI:E5\r");
+    answer(ok);
+    EXPECT_EQ(sent(), "@02EX E1:CF\r");
+    answer(ok);
+    EXPECT_EQ(sent(), "") << "the list wrapped: the next cycle waits for the tick";
+    advance(100ms);
+    EXPECT_EQ(sent(), "@01EX E5 00:52\r");
+    advance(100ms);  // no answer: no time-out, no resend, the next command
+    EXPECT_EQ(sent(), "@01EX DI:E5\r");
+    answer(WithBcc("@01ER:") + "\r");
+    EXPECT_EQ(sent(), "");
+    EXPECT_TRUE(traced("Meter: reply code \"ER\" unknown"));
+    // Reading past the end enlarges the list; its empty entry goes out as "0" + CR.
+    EXPECT_EQ(frm->PollCommand(3), "");
+    advance(100ms);
+    EXPECT_EQ(sent(), "@02EX E1:CF\r");
+    answer(ok);
+    EXPECT_EQ(sent(), "0\r");
+    EXPECT_EQ(frm->PollIndex(), 0);
+    EXPECT_TRUE(traced("Meter: sent @01EX E5 00:52<CR>"));
+    EXPECT_TRUE(traced("Meter: received @01OK:35"));
+    EXPECT_TRUE(names.empty());
+}
+
+TEST_F(IntechLine, ErrorsOfATickOrAReplyAreTracedAndTheNextTickGoesOn) {
+    frm->TmrScanRate.Enabled(true);
+    advance(100ms);  // nothing registered: Subscript out of range, nothing sent
+    EXPECT_TRUE(traced("Meter: error 9 in Maroset.FrmNUVIntech: Subscript out of range"));
+    EXPECT_FALSE(frm->MSComm1.PortOpen());
+
+    runtime().mapSerialPort(1, "/nonexistent/intech", "meter");
+    frm->PollCommand(0, "@01EX DI:");
+    frm->PollCommand(1, "@01EX E1:");
+    advance(100ms);
+    EXPECT_TRUE(traced("Meter: cannot open port 1: Cannot open serial device /nonexistent/intech"));
+    EXPECT_EQ(test::errorOf([&] { frm->SendCommand("@01EX DI:"); }), 8002);
+    runtime().serialDevices().plug("/nonexistent/intech", cable.hostEnd());
+    advance(100ms);
+    EXPECT_EQ(sent(), "@01EX E1:CE\r");
+
+    answer(WithBcc("@01EX DI 00x3 0015:") + "\r");  // a word that is not a number
+    EXPECT_TRUE(traced("Meter: error 13 in Maroset.FrmNUVIntech: Type mismatch"));
+    EXPECT_EQ(sent(), "");
+    cable.cut("unplugged");
+    EXPECT_TRUE(traced("Meter: line broken: unplugged"));
+    platform::MemorySerialCable replugged(loop());
+    runtime().serialDevices().plug("/nonexistent/intech", replugged.hostEnd());
+    advance(100ms);
+    EXPECT_EQ(replugged.takeHostSent(), "@01EX DI:E5\r");
+}
+
+TEST_F(IntechLine, DataRepliesAreDecodedFieldByField) {
+    frm->RXData(WithBcc("@01EX DI 0003 0015:"));
+    frm->RXData(
+        WithBcc("@07EX E2 3FF 000 001 FFF abc 010 100 7FF 800 002 003 004 005 006 007 008:"));
+    frm->RXData(WithBcc("@01EX E5 02 42C80000 3F800000 C2C80000 40490FDB:"));
+    frm->RXData(WithBcc("@01EX E5 00 41200000 3F000000 00000000 42C8:"));  // last one cut short
+    ASSERT_EQ(names.size(), 4u);
+    // The masked bits themselves: LDO2 is 0 or 2, LDI4 0 or 8.
+    EXPECT_EQ(names[0],
+              (std::vector<Variant>{"01LDO1", "01LDO2", "01LDI1", "01LDI2", "01LDI3", "01LDI4"}));
+    EXPECT_EQ(values[0], (std::vector<Variant>{int16_t(1), int16_t(2), int16_t(1), int16_t(2),
+                                               int16_t(4), int16_t(8)}));
+    ASSERT_EQ(names[1].size(), 16u);
+    EXPECT_EQ(names[1].front(), Variant("07EAI17"));
+    EXPECT_EQ(names[1].back(), Variant("07EAI32"));
+    EXPECT_EQ(values[1], (std::vector<Variant>{"1023", "0", "1", "4095", "2748", "16", "256",
+                                               "2047", "2048", "2", "3", "4", "5", "6", "7", "8"}));
+    EXPECT_EQ(names[2], (std::vector<Variant>{"01LAI9", "01LAI10", "01LAI11", "01LAI12"}));
+    EXPECT_EQ(values[2], (std::vector<Variant>{"100.0", "1.0", "-100.0", "3.1"}));
+    EXPECT_EQ(names[3][0], Variant("01LAI1"));
+    EXPECT_EQ(values[3], (std::vector<Variant>{"10.0", "0.5", "0.0", "0.0"}));
+}
+
+TEST_F(IntechLine, FramesFailingACheckAreDroppedWithTheReasonOnTheTrace) {
+    poll({"@01EX DI:", "@01EX E1:"});
+    advance(100ms);
+    sent();
+    const std::pair<std::string, const char*> bad[] = {
+        {"@01OK:3", "too short (7 characters, at least 8)"},
+        {"X01OK:35", "no \"@\" at the start"},
+        {"@01OK;35", "no \":\" third from the end"},
+        {"@01EX DI 0003 0015:ae", "BCC mismatch (computed AE, received ae)"},
+        // "01OKzZ:" sums to 9: one digit, which two received ones never equal.
+        {"@01OKzZ:09", "BCC mismatch (computed 9, received 09; a sum below 16 never matches)"},
+    };
+    for (const auto& [frame, why] : bad) {
+        frm->RXData(frame);
+        EXPECT_EQ(sent(), "") << frame;
+        EXPECT_TRUE(traced(std::string("Meter: dropped reply: ") + why)) << frame;
+    }
+    // Noise, then a frame cut one character past its ":": the next frame ends one early.
+    answer(std::string("\x00garbage\xff:", 10) + "@01OK:3");
+    answer(WithBcc("@01EX DI 0000 0001:") + "\r");
+    EXPECT_TRUE(traced("Meter: dropped 10 characters outside a frame: <0x00>garbage<0xFF>:"));
+    EXPECT_TRUE(names.empty());
+    advance(100ms);
+    EXPECT_EQ(sent(), "@01EX E1:CE\r");
+    answer(WithBcc("@01EX DI 0000 0001:") + "\r");
+    EXPECT_EQ(names.size(), 1u);
+}
+
+TEST_F(IntechLine, BusyIsReadOnlyAndPLCWordCountReadsZero) {
+    EXPECT_EQ(frm->Busy(), 0);
+    EXPECT_EQ(test::errorOf([&] { frm->Busy(1); }), 382);
+    frm->PLCWordCount(2);
+    EXPECT_EQ(frm->PLCWordCount(), 0);
+}
+
+}  // namespace
+}  // namespace maroset
