@@ -12,6 +12,7 @@
 #include "cli/ProjectDatabase.h"
 #include "cli/StopSignal.h"
 #include "cli/UsageError.h"
+#include "cli/WagoStation.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/nodeDB.h"
@@ -58,6 +59,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     std::vector<std::unique_ptr<DemoStation>> stations;
     stations.push_back(std::make_unique<MemoryTagStation>());
     stations.push_back(std::make_unique<DiskTagStation>());
+    stations.push_back(std::make_unique<WagoStation>());
     return stations;
 }
 

@@ -2,6 +2,7 @@
 
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
+#include "drivers/wago/ClsDriverWagoIO.h"
 
 namespace maroset {
 
@@ -21,6 +22,7 @@ struct DriverClass {
 constexpr DriverClass kClasses[] = {
     {"ClsDriverMemTag", make<ClsDriverMemTag>},
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
+    {"ClsDriverWagoIO", make<ClsDriverWagoIO>},
 };
 
 }  // namespace
