@@ -5,6 +5,8 @@
 #include <modbus.h>
 #include <netinet/in.h>
 #include <poll.h>
+#include <pthread.h>
+#include <signal.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -400,7 +402,13 @@ void WagoCouplerSimulator::start() {
     s.refusing = false;
     s.stopping = false;
     s.openListener();  // before the thread, so a failure reaches the caller
+    // The host's signals (Ctrl-C) are for its own thread: the server thread starts with every
+    // signal blocked.
+    sigset_t all, previous;
+    sigfillset(&all);
+    pthread_sigmask(SIG_BLOCK, &all, &previous);
     s.thread = std::thread([&s] { s.run(); });
+    pthread_sigmask(SIG_SETMASK, &previous, nullptr);
 }
 
 void WagoCouplerSimulator::stop() {
