@@ -298,7 +298,21 @@ bool ClsDriverWagoIO::AddItem(const std::string& TagName, int16_t ClientHandle) 
     proc.run([&] { tagNames_(tagCount_) = Variant(name); });
     proc.run([&] { clientHandles_(tagCount_) = ClientHandle; });
     proc.run([&] { lastValues_(tagCount_) = Variant(); });
-    proc.run([&] { tagCount_ = CInt(Variant(static_cast<int32_t>(tagCount_) + 1)); });
+    proc.run([&] {
+        tagCount_ = CInt(Variant(static_cast<int32_t>(tagCount_) + 1));
+        parsed_.resize(static_cast<size_t>(tagCount_));
+        ParsedTag& p = parsed_.back();
+        p = {};
+        if (name.size() > 1) {
+            try {
+                p.address = CInt(Variant(Mid(name, 3)));
+                p.prefix = UCase(Left(name, 2));
+                p.known = true;
+            } catch (const VbError&) {
+                // Left to the scan, which fails on it each pass.
+            }
+        }
+    });
     return false;
 }
 
@@ -382,14 +396,18 @@ void ClsDriverWagoIO::scan() {
         if (alive.expired()) return;
         if (shutDown_) return;
 
-        std::string name;
-        proc.run([&] { name = CStr(tagNames_(i)); });
-        if (name.size() <= 1) continue;
-
         int16_t address = 0;
         std::string prefix;
-        proc.run([&] { address = CInt(Variant(Mid(name, 3))); });
-        proc.run([&] { prefix = UCase(Left(name, 2)); });
+        if (static_cast<size_t>(i) < parsed_.size() && parsed_[i].known) {
+            address = parsed_[i].address;
+            prefix = parsed_[i].prefix;
+        } else {
+            std::string name;
+            proc.run([&] { name = CStr(tagNames_(i)); });
+            if (name.size() <= 1) continue;
+            proc.run([&] { address = CInt(Variant(Mid(name, 3))); });
+            proc.run([&] { prefix = UCase(Left(name, 2)); });
+        }
 
         // A tag no read fills keeps the 0 it starts with.
         int16_t value = 0;

@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "core/Driver.h"
 #include "drivers/wago/FrmWagoTCP.h"
@@ -108,6 +109,15 @@ class ClsDriverWagoIO final : public Driver {
     VbArray<Variant> tagNames_;
     VbArray<int16_t> clientHandles_;
     VbArray<Variant> lastValues_;
+    // What the scan reads from each tag's text, worked out once when the tag is added (a tag's
+    // text never changes). A text that does not parse is not kept: the scan parses it afresh
+    // each pass and fails there, as it would without this.
+    struct ParsedTag {
+        bool known = false;
+        int16_t address = 0;
+        std::string prefix;
+    };
+    std::vector<ParsedTag> parsed_;
     std::unique_ptr<FrmWagoTCP> form_;
     Subscription pollTime_;
     std::string topic_;

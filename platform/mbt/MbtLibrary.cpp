@@ -159,7 +159,7 @@ int32_t MbtLibrary::MBTReadExceptionStatus(Handle hSocket, uint8_t& exceptionSta
     const uint8_t request[] = {MODBUS_TCP_SLAVE, kReadExceptionStatus};
     errno = 0;
     if (modbus_send_raw_request(c->ctx, request, sizeof request) == -1) return failed(*c, errno);
-    std::array<uint8_t, MODBUS_TCP_MAX_ADU_LENGTH> reply{};
+    std::array<uint8_t, MODBUS_TCP_MAX_ADU_LENGTH> reply{};  // read past a short reply: zeros
     errno = 0;
     const int length = modbus_receive_confirmation(c->ctx, reply.data());
     if (length == -1) return failed(*c, errno);
@@ -213,7 +213,7 @@ int32_t MbtLibrary::MBTReadCoils(Handle hSocket, uint8_t tableType, uint16_t dat
     Connection* c = nullptr;
     if (const int32_t status = usable(hSocket, c)) return status;
 
-    std::array<uint8_t, kMaxReadBits> bits{};  // libmodbus gives one byte per bit
+    std::array<uint8_t, kMaxReadBits> bits;  // one byte per bit, filled up to numBits
     errno = 0;
     const int n = tableType == kDiscreteInputs
                       ? modbus_read_input_bits(c->ctx, dataStartAddress, numBits, bits.data())
@@ -235,7 +235,7 @@ int32_t MbtLibrary::MBTWriteRegisters(Handle hSocket, uint16_t dataStartAddress,
     Connection* c = nullptr;
     if (const int32_t status = usable(hSocket, c)) return status;
 
-    std::array<uint16_t, kMaxWriteWords> words{};
+    std::array<uint16_t, kMaxWriteWords> words;
     for (uint16_t i = 0; i < numWords; ++i)
         words[i] = static_cast<uint16_t>((writeBuffer[2 * i] << 8) | writeBuffer[2 * i + 1]);
     errno = 0;
@@ -253,7 +253,7 @@ int32_t MbtLibrary::MBTWriteCoils(Handle hSocket, uint16_t dataStartAddress, uin
     Connection* c = nullptr;
     if (const int32_t status = usable(hSocket, c)) return status;
 
-    std::array<uint8_t, kMaxWriteBits> bits{};
+    std::array<uint8_t, kMaxWriteBits> bits;
     for (uint16_t i = 0; i < numBits; ++i) bits[i] = (writeBuffer[i / 8] >> (i % 8)) & 1u;
     errno = 0;
     if (modbus_write_bits(c->ctx, dataStartAddress, numBits, bits.data()) == -1)
