@@ -168,9 +168,11 @@ void ClsDriverWagoIO::disconnect_from_coupler() {
 
 void ClsDriverWagoIO::WagoIOError() {
     Procedure proc(kModule, "WagoIOError");
-    if (tracing())
-        Runtime::current().trace().write(traceSource(),
-                                         "reconnecting to the coupler at " + CStr(IPAddress()));
+    proc.run([&] {
+        if (tracing())
+            Runtime::current().trace().write(traceSource(),
+                                             "reconnecting to the coupler at " + CStr(IPAddress()));
+    });
     proc.run([&] { disconnect_from_coupler(); });
     proc.run([&] { connect_to_coupler(); });
 }

@@ -11,12 +11,17 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
+#include <condition_variable>
 #include <cstdlib>
 #include <cstring>
+#include <deque>
+#include <mutex>
 #include <optional>
 #include <stdexcept>
+#include <thread>
 #include <utility>
 
 namespace maroset::sim {
@@ -151,6 +156,8 @@ struct WagoCouplerSimulator::Server {
                         nextMotion - Clock::now());
                     timeout = static_cast<int>(std::max<int64_t>(0, left.count()));
                 }
+                // A listener that could not be had yet is tried again soon.
+                if (!refusing && listener < 0) timeout = timeout < 0 ? 100 : std::min(timeout, 100);
             }
             fds.push_back({wake, POLLIN, 0});
             if (listener >= 0) fds.push_back({listener, POLLIN, 0});
