@@ -15,6 +15,7 @@
 #include "cli/ProjectDatabase.h"
 #include "cli/StopSignal.h"
 #include "cli/UsageError.h"
+#include "cli/WagoStation.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/nodeDB.h"
@@ -64,6 +65,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     stations.push_back(std::make_unique<Df1Station>());
     stations.push_back(std::make_unique<OpcStation>());
     stations.push_back(std::make_unique<IntechStation>());
+    stations.push_back(std::make_unique<WagoStation>());
     return stations;
 }
 

@@ -5,6 +5,7 @@
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
 #include "drivers/opc/ClsDriverOPC.h"
+#include "drivers/wago/ClsDriverWagoIO.h"
 
 namespace maroset {
 
@@ -27,6 +28,7 @@ constexpr DriverClass kClasses[] = {
     {"ClsDriverNuvAbDf1", make<ClsDriverNuvAbDf1>},
     {"ClsDriverOPC", make<ClsDriverOPC>},
     {"ClsDriverIntech", make<ClsDriverIntech>},
+    {"ClsDriverWagoIO", make<ClsDriverWagoIO>},
 };
 
 }  // namespace

@@ -13,15 +13,17 @@ namespace {
 TEST(DemoTest, ShowsValueChangesOfEveryStationAndCleansUp) {
     const auto r = RunCli({"demo", "--seconds", "2", "--json"});
     ASSERT_EQ(r.status, 0) << r.errors;
-    // Events only on standard output; the disk tag is read back first, then counts. A PLC's
-    // poll reports all its changed tags in one event.
-    const std::string event = "{\"event\":\"ValueChange\",\"count\":1,";
-    for (const auto& line : r.lines)
-        EXPECT_EQ(line.rfind("{\"event\":\"ValueChange\",\"count\":", 0), 0u) << line;
+    // Events only on standard output; the disk tag is read back first, then counts.
+    const std::string event = "{\"event\":\"ValueChange\",\"count\":";
+    for (const auto& line : r.lines) EXPECT_EQ(line.rfind(event, 0), 0u) << line;
     for (const std::string seen :
-         {"\"handles\":[1],\"values\":[20]}", "\"handles\":[11],\"values\":[\"0\"]}",
-          "\"handles\":[11],\"values\":[1]}"})
+         {"1,\"handles\":[1],\"values\":[20]}", "1,\"handles\":[11],\"values\":[\"0\"]}",
+          "1,\"handles\":[11],\"values\":[1]}"})
         EXPECT_NE(std::find(r.lines.begin(), r.lines.end(), event + seen), r.lines.end()) << seen;
+    // The coupler's first pass reports all of its tags at once.
+    const std::string coupler = event + "5,\"handles\":[51,52,53,54,55],";
+    EXPECT_TRUE(std::any_of(r.lines.begin(), r.lines.end(),
+                            [&](const std::string& l) { return l.rfind(coupler, 0) == 0; }));
 
     // The narration names the temporary drive root, which is gone afterwards.
     std::smatch root;
