@@ -83,17 +83,18 @@ void LoopCore::runPosted(const bool* stop) {
 }
 
 void LoopCore::runDueTimers(Duration now, const bool* stop) {
-    std::vector<TimerKey> due;
-    for (auto it = timers_.begin(); it != timers_.end() && it->first.first <= now; ++it)
-        due.push_back(it->first);
-    for (const TimerKey& key : due) {
-        if (stopped(stop)) return;
-        auto it = timers_.find(key);
-        if (it == timers_.end()) continue;  // cancelled, or already run by a nested pump
+    // Only timers that existed before this step run in it: ids grow, so a timer scheduled by
+    // a callback here has an id at or above `limit` and waits for a later step. The map is
+    // looked at afresh after each callback, which may cancel, schedule or run anything.
+    const TimerId limit = nextTimer_;
+    while (!stopped(stop)) {
+        auto it = timers_.begin();
+        while (it != timers_.end() && it->first.first <= now && it->first.second >= limit) ++it;
+        if (it == timers_.end() || it->first.first > now) return;
         // The callback lives here while it runs, so it may destroy whatever scheduled it.
         std::function<void()> fn = std::move(it->second);
+        dueOf_.erase(it->first.second);
         timers_.erase(it);
-        dueOf_.erase(key.second);
         fn();
     }
 }

@@ -4,9 +4,10 @@
 
 namespace maroset::platform {
 
-// What the loop's callbacks reach through a weak reference: it outlives the Timer only while
-// a tick is in progress, so a handler may destroy the Timer.
-struct Timer::State {
+// What the loop's callbacks reach: it outlives the Timer only while a tick is in progress, so
+// a handler may destroy the Timer. The Timer cancels its pending tick when it goes, so a
+// scheduled callback always finds its State.
+struct Timer::State : std::enable_shared_from_this<State> {
     explicit State(EventLoop& l, Timer* t) : loop(l), owner(t) {}
 
     EventLoop& loop;
@@ -25,19 +26,19 @@ struct Timer::State {
     }
 
     // Starts the count afresh.
-    void arm(const std::shared_ptr<State>& self) {
+    void arm() {
         disarm();
-        if (enabled && interval > 0) schedule(self, EventLoop::Duration(interval));
+        if (enabled && interval > 0) schedule(EventLoop::Duration(interval));
     }
 
-    void schedule(const std::shared_ptr<State>& self, EventLoop::Duration delay) {
-        pending = loop.schedule(delay, [weak = std::weak_ptr<State>(self)] { fire(weak); });
+    void schedule(EventLoop::Duration delay) {
+        // A plain pointer keeps the callback small enough for the loop to store it in place.
+        pending = loop.schedule(delay, [this] { fire(shared_from_this()); });
         armed = true;
     }
 
-    static void fire(const std::weak_ptr<State>& weak) {
-        const std::shared_ptr<State> s = weak.lock();
-        if (!s || !s->owner) return;
+    static void fire(const std::shared_ptr<State>& s) {
+        if (!s->owner) return;
         s->armed = false;
         if (!s->enabled || s->interval <= 0) return;
         if (s->ticking) {
@@ -46,7 +47,7 @@ struct Timer::State {
             return;
         }
         // The next tick is counted from this one, not from the end of the handler.
-        s->schedule(s, EventLoop::Duration(s->interval));
+        s->schedule(EventLoop::Duration(s->interval));
         {
             struct TickScope {
                 State& s;
@@ -57,7 +58,7 @@ struct Timer::State {
         }
         if (s->deferred && s->owner && s->enabled && s->interval > 0 && !s->armed) {
             s->deferred = false;
-            s->schedule(s, EventLoop::Duration(0));  // the missed tick, at the next turn
+            s->schedule(EventLoop::Duration(0));  // the missed tick, at the next turn
         }
     }
 };
@@ -77,7 +78,7 @@ void Timer::Interval(int32_t ms) {
     // The timer control refuses a negative interval.
     if (ms < 0) throw VbError(err::InvalidPropertyValue);
     state_->interval = ms;
-    if (state_->enabled) state_->arm(state_);
+    if (state_->enabled) state_->arm();
 }
 
 bool Timer::Enabled() const {
@@ -89,7 +90,7 @@ void Timer::Enabled(bool on) {
     if (on == state_->enabled) return;
     state_->enabled = on;
     if (on)
-        state_->arm(state_);
+        state_->arm();
     else
         state_->disarm();
 }
