@@ -2,6 +2,7 @@
 
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
+#include "drivers/softplc/ClsDriverNUVSoftPLC.h"
 
 namespace maroset {
 
@@ -21,6 +22,7 @@ struct DriverClass {
 constexpr DriverClass kClasses[] = {
     {"ClsDriverMemTag", make<ClsDriverMemTag>},
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
+    {"ClsDriverNUVSoftPLC", make<ClsDriverNUVSoftPLC>},
 };
 
 }  // namespace
