@@ -20,7 +20,7 @@ void ArrivalSplitter::feed(char byte) {
 
 void ArrivalSplitter::feed(std::string_view chunk) {
     // A '%' left from the previous chunk may pair with this chunk's first byte.
-    if (percent_ && !chunk.empty()) {
+    while (percent_ && !chunk.empty()) {
         feed(chunk.front());
         chunk.remove_prefix(1);
     }
