@@ -10,6 +10,7 @@
 #include "cli/EventPrinter.h"
 #include "cli/MemoryTagStation.h"
 #include "cli/ProjectDatabase.h"
+#include "cli/SoftPlcStation.h"
 #include "cli/StopSignal.h"
 #include "cli/UsageError.h"
 #include "core/ClsNodeDBInterface.h"
@@ -58,6 +59,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     std::vector<std::unique_ptr<DemoStation>> stations;
     stations.push_back(std::make_unique<MemoryTagStation>());
     stations.push_back(std::make_unique<DiskTagStation>());
+    stations.push_back(std::make_unique<SoftPlcStation>());
     return stations;
 }
 

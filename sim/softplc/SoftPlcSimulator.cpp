@@ -396,10 +396,7 @@ void SoftPlcSimulator::onFrame(Session& session, const std::string& type, const 
             session.subscription.emplace_back(static_cast<int32_t>(*handle), name);
         }
         // A new subscriber gets every value at once.
-        std::string text = std::to_string(session.subscription.size());
-        for (const auto& [h, name] : session.subscription)
-            text += ";~" + std::to_string(h) + ";~" + tags_[h].value;
-        if (!session.subscription.empty()) session.send("NTV", text);
+        push(session, nullptr);
     } else if (type == "RSL") {
         session.subscription.clear();
     } else if (type == "NTV" || type == "ATV") {
@@ -426,7 +423,7 @@ void SoftPlcSimulator::applyWrites(Session& session, const std::string& type,
             if (!handle) continue;
             Tag& t = tagFor(static_cast<int32_t>(*handle), {});
             t.value = fields[2 + 2 * i];
-            t.moving = decimalNumber(t.value).has_value();
+            t.moving = false;  // a written value holds until it is written again
             changed.push_back(static_cast<int32_t>(*handle));
         }
     } else {
@@ -448,16 +445,23 @@ void SoftPlcSimulator::applyWrites(Session& session, const std::string& type,
 void SoftPlcSimulator::pushToSubscribers(const std::vector<int32_t>& handles) {
     if (handles.empty()) return;
     const auto sessions = sessions_;  // a send may end a session
-    for (const auto& s : sessions) {
-        std::string text;
-        int32_t n = 0;
-        for (const auto& [h, name] : s->subscription) {
-            if (std::find(handles.begin(), handles.end(), h) == handles.end()) continue;
-            text += ";~" + std::to_string(h) + ";~" + tags_[h].value;
-            ++n;
+    for (const auto& s : sessions) push(*s, &handles);
+}
+
+void SoftPlcSimulator::push(Session& session, const std::vector<int32_t>* handles) {
+    std::string text;
+    int32_t n = 0;
+    for (const auto& [h, name] : session.subscription) {
+        if (handles && std::find(handles->begin(), handles->end(), h) == handles->end()) continue;
+        const std::string field = ";~" + std::to_string(h) + ";~" + tags_[h].value;
+        if (options_.oneValuePerFrame) {
+            session.send("NTV", "1" + field);
+            continue;
         }
-        if (n > 0) s->send("NTV", std::to_string(n) + text);
+        text += field;
+        ++n;
     }
+    if (n > 0) session.send("NTV", std::to_string(n) + text);
 }
 
 void SoftPlcSimulator::setValue(int32_t handle, const std::string& value) {
@@ -488,15 +492,8 @@ void SoftPlcSimulator::step() {
 
 void SoftPlcSimulator::flood(int32_t frames) {
     const auto sessions = sessions_;
-    for (int32_t i = 0; i < frames; ++i) {
-        for (const auto& s : sessions) {
-            if (s->subscription.empty()) continue;
-            std::string text = std::to_string(s->subscription.size());
-            for (const auto& [h, name] : s->subscription)
-                text += ";~" + std::to_string(h) + ";~" + tags_[h].value;
-            s->send("NTV", text);
-        }
-    }
+    for (int32_t i = 0; i < frames; ++i)
+        for (const auto& s : sessions) push(*s, nullptr);
 }
 
 std::string SoftPlcSimulator::help() const {

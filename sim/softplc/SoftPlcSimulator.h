@@ -20,10 +20,10 @@ namespace maroset::sim {
 // A soft-PLC server: accepts clients over TCP (loopback) or in memory (plugged into the
 // runtime's TcpNetwork), acknowledges their frames and answers a NAK to bad ones, keeps tag
 // values by handle, honours "TSL" and "RSL" subscriptions, pushes "NTV" frames with the
-// values of subscribed tags (the values move over time), applies "NTV" and "ATV" writes and
-// pushes the written values back to every client subscribed to them. Its own frames are
-// resent like the client's: on a NAK (the oldest, up to its third try) and after three
-// silent ticks of 500 ms (up to three resends).
+// values of subscribed tags (the values move over time), applies "NTV" and "ATV" writes (a
+// written value then holds) and pushes the written values back to every client subscribed
+// to them. Its own frames are resent like the client's: on a NAK (the oldest, up to its
+// third try) and after three silent ticks of 500 ms (up to three resends).
 //
 // Faults on demand, through the typed methods below and through command():
 // drop the ACKs of the next frames, answer them with a NAK instead, split the next frames
@@ -37,6 +37,9 @@ class SoftPlcSimulator final : public Simulator {
         // The gap between the two writes of a split frame; over TCP they would otherwise
         // often arrive as one.
         int32_t splitGapMs = 0;
+        // One NTV frame per value instead of one frame per client with all its changes
+        // (hosts then see every change as a report of its own).
+        bool oneValuePerFrame = false;
     };
     // A value as the server holds it, text as it goes on the wire.
     struct Tag {
@@ -99,6 +102,8 @@ class SoftPlcSimulator final : public Simulator {
     void onFrame(Session& session, const std::string& type, const std::string& data);
     void applyWrites(Session& session, const std::string& type, const std::string& data);
     void pushToSubscribers(const std::vector<int32_t>& handles);
+    // One client's share of the values of `handles` (all it subscribes when empty).
+    void push(Session& session, const std::vector<int32_t>* handles);
     Tag& tagFor(int32_t handle, const std::string& name);
 
     Options options_;
