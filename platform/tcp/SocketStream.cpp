@@ -172,6 +172,10 @@ void SocketStream::readOnce() {
 
 void SocketStream::write(std::string_view bytes) {
     if (phase_ == Phase::Done || bytes.empty()) return;
+    if (outbox_.size() + bytes.size() > MaxWaiting) {
+        failLater(sck::NoBufferSpace);
+        return;
+    }
     outbox_.append(bytes);
     if (phase_ == Phase::Connected) flush();
 }

@@ -21,12 +21,16 @@ namespace maroset::platform {
 //
 // Each readiness of the socket is one recv() of at most ReadChunk bytes, delivered as one
 // arrival, so a peer that floods the connection cannot keep the loop from its timers.
-// Writes that the socket cannot take at once wait in a buffer and go out as it drains.
+// Writes that the socket cannot take at once wait in a buffer and go out as it drains (up to
+// MaxWaiting bytes).
 // Nagle's algorithm is off: every frame leaves at once.
 class SocketStream final : public TcpStream, public std::enable_shared_from_this<SocketStream> {
   public:
     static constexpr std::chrono::milliseconds ConnectTimeout{21000};
     static constexpr size_t ReadChunk = 64 * 1024;
+    // Bytes a peer that stops reading may leave waiting before the connection is given up
+    // with 10055: a server that floods and never reads cannot make the host grow for ever.
+    static constexpr size_t MaxWaiting = 16 * 1024 * 1024;
 
     static std::shared_ptr<SocketStream> Connect(EventLoop& loop, const std::string& host,
                                                  int32_t port);
