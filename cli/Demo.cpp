@@ -13,6 +13,7 @@
 #include "cli/MemoryTagStation.h"
 #include "cli/OpcStation.h"
 #include "cli/ProjectDatabase.h"
+#include "cli/SoftPlcStation.h"
 #include "cli/StopSignal.h"
 #include "cli/UsageError.h"
 #include "cli/WagoStation.h"
@@ -66,6 +67,7 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     stations.push_back(std::make_unique<OpcStation>());
     stations.push_back(std::make_unique<IntechStation>());
     stations.push_back(std::make_unique<WagoStation>());
+    stations.push_back(std::make_unique<SoftPlcStation>());
     return stations;
 }
 

@@ -14,6 +14,7 @@
 #include "sim/df1/Df1Simulator.h"
 #include "sim/intech/IntechSimulator.h"
 #include "sim/wago/WagoCouplerSimulator.h"
+#include "sim/softplc/SoftPlcSimulator.h"
 
 namespace maroset::cli {
 
@@ -107,6 +108,32 @@ const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
          },
          "Reach it from a project node of type WAGOIO with IPAddress 127.0.0.1: couplers use port\n"
          "502, so run the host as: maroset run PROJECT --modbus-port PORT (PORT: the port of {})"},
+        {"softplc",
+         "soft-PLC server (TCP)",
+         "usage: maroset sim softplc [--port P] [--step MS]\n"
+         "\n"
+         "Runs a soft-PLC server on 127.0.0.1 and prints the port it listens on. It accepts\n"
+         "NUVTCPIP nodes, acknowledges their frames, keeps tag values by handle, pushes the\n"
+         "values of subscribed tags as they move and takes their writes.\n"
+         "\n"
+         "Options:\n"
+         "  --port P    the TCP port (0 or absent: a free port)\n"
+         "  --step MS   how often subscribed values move (default 1000; 0: only on writes)\n"
+         "\n"
+         "Commands on standard input (type help): values, set HANDLE VALUE, step,\n"
+         "drop-acks N, nak N, split N, corrupt N, silent on|off, close, stop, start,\n"
+         "restart, flood N, clients, received.\n",
+         {{"port", true}, {"step", true}},
+         [](const CommandLine& o) -> std::unique_ptr<sim::Simulator> {
+             sim::SoftPlcSimulator::Options options;
+             options.stepMs = o.integer("step", 0, 3600000).value_or(1000);
+             options.splitGapMs = 50;  // so the two writes of a split frame arrive apart
+             return sim::SoftPlcSimulator::OnLoopback(o.integer("port", 0, 65535).value_or(0),
+                                                      options);
+         },
+         "Point a node at it: Driver NUVTCPIP, IPAddress 127.0.0.1, Port as in {}, e.g.\n"
+         "  maroset project add plant.db PLC1 NUVTCPIP --ip-address 127.0.0.1 --port PORT "
+         "--update-rate 1000"},
     };
     return kinds;
 }

@@ -34,7 +34,8 @@ Runtime::Runtime(std::unique_ptr<platform::EventLoop> loop, std::unique_ptr<plat
       files_(std::move(driveRoot)),
       messageBox_([](const std::string& text) { std::cerr << text << std::endl; }),
       trap_(*clock_, files_, [this](const std::string& text) { MsgBox(text); }),
-      serialDevices_(*loop_) {}
+      serialDevices_(*loop_),
+      tcp_(*loop_) {}
 
 Runtime::~Runtime() {
     // Nodes shut their drivers down while the loop, files and trap are still here.

@@ -12,6 +12,7 @@
 #include "platform/LinkTrace.h"
 #include "platform/opc/OpcServerRegistry.h"
 #include "platform/serial/SerialDevices.h"
+#include "platform/tcp/TcpNetwork.h"
 
 namespace maroset {
 
@@ -61,6 +62,9 @@ class Runtime {
     // Where serial ports open their devices (tests plug in-memory cables here).
     platform::SerialDevices& serialDevices() { return serialDevices_; }
 
+    // Where TCP clients connect (tests plug in-memory servers here).
+    platform::TcpNetwork& tcp() { return tcp_; }
+
     // The link trace drivers write to (off unless a host gives it a sink).
     platform::LinkTrace& trace() { return trace_; }
 
@@ -84,6 +88,7 @@ class Runtime {
     MessageBox messageBox_;
     ErrorTrap trap_;
     platform::SerialDevices serialDevices_;
+    platform::TcpNetwork tcp_;
     platform::LinkTrace trace_;
     // Keyed by upper-cased node name ("" for every node) and port.
     std::map<std::pair<std::string, int>, std::string> serialPorts_;

@@ -6,6 +6,7 @@
 #include "drivers/local/ClsDriverMemTag.h"
 #include "drivers/opc/ClsDriverOPC.h"
 #include "drivers/wago/ClsDriverWagoIO.h"
+#include "drivers/softplc/ClsDriverNUVSoftPLC.h"
 
 namespace maroset {
 
@@ -29,6 +30,7 @@ constexpr DriverClass kClasses[] = {
     {"ClsDriverOPC", make<ClsDriverOPC>},
     {"ClsDriverIntech", make<ClsDriverIntech>},
     {"ClsDriverWagoIO", make<ClsDriverWagoIO>},
+    {"ClsDriverNUVSoftPLC", make<ClsDriverNUVSoftPLC>},
 };
 
 }  // namespace
