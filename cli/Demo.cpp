@@ -64,10 +64,10 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     stations.push_back(std::make_unique<MemoryTagStation>());
     stations.push_back(std::make_unique<DiskTagStation>());
     stations.push_back(std::make_unique<Df1Station>());
-    stations.push_back(std::make_unique<OpcStation>());
     stations.push_back(std::make_unique<IntechStation>());
-    stations.push_back(std::make_unique<WagoStation>());
     stations.push_back(std::make_unique<SoftPlcStation>());
+    stations.push_back(std::make_unique<WagoStation>());
+    stations.push_back(std::make_unique<OpcStation>());
     return stations;
 }
 

@@ -13,8 +13,8 @@
 #include "lang/VbError.h"
 #include "sim/df1/Df1Simulator.h"
 #include "sim/intech/IntechSimulator.h"
-#include "sim/wago/WagoCouplerSimulator.h"
 #include "sim/softplc/SoftPlcSimulator.h"
+#include "sim/wago/WagoCouplerSimulator.h"
 
 namespace maroset::cli {
 
@@ -89,25 +89,6 @@ const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
          StartIntech,
          "Connect a host: maroset run PROJECT --com 1={}\n(NUVINTECH nodes use port 1; --com "
          "NODE:1=PATH maps it for one node only)"},
-        {"wago",
-         "WAGO coupler (Modbus/TCP)",
-         "usage: maroset sim wago [--port P]\n"
-         "\n"
-         "A WAGO fieldbus coupler on 127.0.0.1: input words 0-255 (function 04) and bits 0-511\n"
-         "(02) that move once a second, output words 0-255 and bits 0-4607 that writes set\n"
-         "(06/16, 05/15) and that read back at 512 + n (03, 01; bits from 4095 on at 4096 + n),\n"
-         "and the exception status (07).\n"
-         "\n"
-         "Options:\n"
-         "  --port P   the TCP port to listen on (0 or absent: a free one)\n",
-         {{"port", true}},
-         [](const CommandLine& options) -> std::unique_ptr<sim::Simulator> {
-             sim::WagoCouplerSimulator::Options o;
-             o.port = static_cast<uint16_t>(options.integer("port", 0, 65535).value_or(0));
-             return std::make_unique<sim::WagoCouplerSimulator>(o);
-         },
-         "Reach it from a project node of type WAGOIO with IPAddress 127.0.0.1: couplers use port\n"
-         "502, so run the host as: maroset run PROJECT --modbus-port PORT (PORT: the port of {})"},
         {"softplc",
          "soft-PLC server (TCP)",
          "usage: maroset sim softplc [--port P] [--step MS]\n"
@@ -134,6 +115,25 @@ const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
          "Point a node at it: Driver NUVTCPIP, IPAddress 127.0.0.1, Port as in {}, e.g.\n"
          "  maroset project add plant.db PLC1 NUVTCPIP --ip-address 127.0.0.1 --port PORT "
          "--update-rate 1000"},
+        {"wago",
+         "WAGO coupler (Modbus/TCP)",
+         "usage: maroset sim wago [--port P]\n"
+         "\n"
+         "A WAGO fieldbus coupler on 127.0.0.1: input words 0-255 (function 04) and bits 0-511\n"
+         "(02) that move once a second, output words 0-255 and bits 0-4607 that writes set\n"
+         "(06/16, 05/15) and that read back at 512 + n (03, 01; bits from 4095 on at 4096 + n),\n"
+         "and the exception status (07).\n"
+         "\n"
+         "Options:\n"
+         "  --port P   the TCP port to listen on (0 or absent: a free one)\n",
+         {{"port", true}},
+         [](const CommandLine& options) -> std::unique_ptr<sim::Simulator> {
+             sim::WagoCouplerSimulator::Options o;
+             o.port = static_cast<uint16_t>(options.integer("port", 0, 65535).value_or(0));
+             return std::make_unique<sim::WagoCouplerSimulator>(o);
+         },
+         "Reach it from a project node of type WAGOIO with IPAddress 127.0.0.1: couplers use port\n"
+         "502, so run the host as: maroset run PROJECT --modbus-port PORT (PORT: the port of {})"},
     };
     return kinds;
 }

@@ -8,8 +8,9 @@
 namespace maroset {
 
 // The driver classes a node can create, by the class name its type key selects
-// ("ClsDriverMemTag", "ClsDriverDiskTag", ...). A class that is not built yet gives a memory
-// tag driver, as an unknown type key does.
+// ("ClsDriverMemTag", "ClsDriverDiskTag", ...). A name the catalog does not hold fails with
+// ActiveX component can't create object (429); an unknown type key never gets here, the node
+// makes a memory tag driver for it.
 //
 // The node only names the class; the list of classes is defined with the drivers, in
 // drivers/DriverCatalog.cpp, so a new driver family is one more row there.

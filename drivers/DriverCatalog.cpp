@@ -5,8 +5,9 @@
 #include "drivers/local/ClsDriverDiskTag.h"
 #include "drivers/local/ClsDriverMemTag.h"
 #include "drivers/opc/ClsDriverOPC.h"
-#include "drivers/wago/ClsDriverWagoIO.h"
 #include "drivers/softplc/ClsDriverNUVSoftPLC.h"
+#include "drivers/wago/ClsDriverWagoIO.h"
+#include "lang/VbError.h"
 
 namespace maroset {
 
@@ -27,10 +28,10 @@ constexpr DriverClass kClasses[] = {
     {"ClsDriverMemTag", make<ClsDriverMemTag>},
     {"ClsDriverDiskTag", make<ClsDriverDiskTag>},
     {"ClsDriverNuvAbDf1", make<ClsDriverNuvAbDf1>},
-    {"ClsDriverOPC", make<ClsDriverOPC>},
     {"ClsDriverIntech", make<ClsDriverIntech>},
-    {"ClsDriverWagoIO", make<ClsDriverWagoIO>},
     {"ClsDriverNUVSoftPLC", make<ClsDriverNUVSoftPLC>},
+    {"ClsDriverWagoIO", make<ClsDriverWagoIO>},
+    {"ClsDriverOPC", make<ClsDriverOPC>},
 };
 
 }  // namespace
@@ -39,8 +40,8 @@ std::shared_ptr<Driver> CreateDriver(std::string_view className) {
     for (const DriverClass& c : kClasses) {
         if (c.name == className) return c.create();
     }
-    // Classes not built yet fall back to memory tags, as an unknown type key does.
-    return std::make_shared<ClsDriverMemTag>();
+    // The node asks only for the classes above; anything else is a class the library lacks.
+    throw VbError(err::CantCreateObject);
 }
 
 }  // namespace maroset
