@@ -4,6 +4,7 @@
 
 #include <iostream>
 #include <system_error>
+#include <utility>
 
 #include "cli/CommandLine.h"
 #include "cli/Df1Station.h"
@@ -141,10 +142,14 @@ void Demo::runProject(const std::filesystem::path& root) {
     platform::EventLoop& loop = rt.loop();
 
     // Nodes, simulators and scanning are undone whatever happens on the way.
+    // Drivers may still report while they shut down (one that yields to the loop lets the
+    // others' timers run), so the summary is counted after it.
     struct Teardown {
         nodeDB& db;
         std::vector<std::unique_ptr<DemoStation>>& stations;
-        ~Teardown() {
+        bool done = false;
+        void run() {
+            if (std::exchange(done, true)) return;
             try {
                 db.StopScanning();
                 db.RemoveAllNodes();
@@ -152,6 +157,7 @@ void Demo::runProject(const std::filesystem::path& root) {
             }
             for (auto& s : stations) s->stopSimulator();
         }
+        ~Teardown() { run(); }
     } teardown{db, stations_};
 
     for (auto& s : stations_) s->startSimulator();
@@ -182,6 +188,7 @@ void Demo::runProject(const std::filesystem::path& root) {
 
     const auto elapsed =
         std::chrono::duration_cast<std::chrono::seconds>(loop.now() - started).count();
+    teardown.run();
     narration_ << (interrupt.received() ? "Interrupted" : "Stopped") << " after " << elapsed
                << " s: " << printer.valueChanges() << " value changes, " << printer.driverErrors()
                << " driver errors." << std::endl;

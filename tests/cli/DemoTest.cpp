@@ -32,7 +32,9 @@ TEST(DemoTest, ShowsValueChangesOfEveryStationAndCleansUp) {
     EXPECT_FALSE(std::filesystem::exists(root[1].str()));
     const std::string summary =
         "Stopped after 2 s: " + std::to_string(r.lines.size()) + " value changes, 0 driver errors.";
-    EXPECT_NE(r.errors.find(summary), std::string::npos) << r.errors;
+    EXPECT_NE(r.errors.find(summary), std::string::npos)
+        << r.errors << r.lines.size() << " lines on standard output, the last: "
+        << (r.lines.empty() ? "" : r.lines.back());
 }
 
 }  // namespace
