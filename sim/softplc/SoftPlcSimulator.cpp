@@ -176,7 +176,8 @@ class SoftPlcSimulator::Session : public std::enable_shared_from_this<Session> {
             --server_.dropAcks_;  // taken, but the ACK is lost
         } else {
             char digits[4];
-            std::snprintf(digits, sizeof digits, "%03d", frame.number % 1000);
+            std::snprintf(digits, sizeof digits, "%03u",
+                          static_cast<unsigned>(frame.number) % 1000u);
             send("ACK", digits);
         }
         server_.onFrame(*this, frame.type, frame.data);
