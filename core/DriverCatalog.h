@@ -1,19 +1,37 @@
 #pragma once
 
+#include <functional>
 #include <memory>
+#include <span>
 #include <string_view>
 
 #include "core/Driver.h"
 
 namespace maroset {
 
-// The driver classes a node can create, by the class name its type key selects
-// ("ClsDriverMemTag", "ClsDriverDiskTag", ...). A name the catalog does not hold fails with
-// ActiveX component can't create object (429); an unknown type key never gets here, the node
-// makes a memory tag driver for it.
-//
-// The node only names the class; the list of classes is defined with the drivers, in
-// drivers/DriverCatalog.cpp, so a new driver family is one more row there.
-std::shared_ptr<Driver> CreateDriver(std::string_view className);
+class node;
+
+// One driver family: the type key a node's Driver column names (upper-cased), the driver class
+// it creates, and how node.Init configures and starts a new driver of that class. Each family
+// has its own order of steps (most set what startup needs before it and TagPrefex and NodeName
+// after it; the soft PLC gets NodeName first, the Intech driver gets it twice); the orders
+// are intended and kept.
+struct DriverFamily {
+    // Runs one configuration step on the new driver, as one statement of node.Init under its
+    // error trap.
+    using Step = std::function<void(const std::function<void(Driver&)>&)>;
+
+    std::string_view typeKey;
+    std::string_view className;
+    std::shared_ptr<Driver> (*create)();
+    void (*configure)(const node& n, const Step& step);
+};
+
+// Every driver family, defined with the drivers in drivers/DriverCatalog.cpp: the one list a
+// new driver family adds its row to. The first one, memory tags, is also the family of a type
+// key no row names.
+std::span<const DriverFamily> DriverFamilies();
+// The family of an upper-cased type key (memory tags for a key no row names).
+const DriverFamily& DriverFamilyOf(std::string_view typeKey);
 
 }  // namespace maroset

@@ -38,56 +38,12 @@ void node::Init() {
     const auto self = weak_from_this().lock();
     Procedure proc(kModule, "Init");
     proc.run([&] { driverType_ = UCase(CStr(DriverName)); });
-
-    // Each type gets its properties and startup in its own order; the orders are intended.
-    auto create = [&](const char* cls) { proc.run([&] { driver_ = CreateDriver(cls); }); };
-    auto step = [&](auto&& statement) { proc.run([&] { statement(*requireDriver()); }); };
-    auto nodeName = [&](Driver& drv) { drv.NodeName(Name); };
-
-    if (driverType_ == "MEMTAG") {
-        create("ClsDriverMemTag");
-        step(nodeName);
-    } else if (driverType_ == "DISKTAG") {
-        create("ClsDriverDiskTag");
-        step([&](Driver& drv) { drv.startup("ServerName", Name); });
-        step(nodeName);
-    } else if (driverType_ == "OPC") {
-        create("ClsDriverOPC");
-        step([&](Driver& drv) { drv.OPCTopic(OPCTopic); });
-        step([&](Driver& drv) { drv.ScanRate(ScanRate); });
-        step([&](Driver& drv) { drv.startup(CStr(ServerName), Name); });
-        step([&](Driver& drv) { drv.TagPrefex(TagPrefex); });
-        step(nodeName);
-    } else if (driverType_ == "WAGOIO") {
-        create("ClsDriverWagoIO");
-        step([&](Driver& drv) { drv.ScanRate(ScanRate); });
-        step([&](Driver& drv) { drv.IPAddress(IPAddress); });
-        step([&](Driver& drv) { drv.Port(Port); });
-        step([&](Driver& drv) { drv.startup("WagoIO", Name); });
-        step([&](Driver& drv) { drv.TagPrefex(TagPrefex); });
-        step(nodeName);
-    } else if (driverType_ == "NUVINTECH") {
-        create("ClsDriverIntech");
-        step(nodeName);
-        step([&](Driver& drv) { drv.ScanRate(ScanRate); });
-        step([&](Driver& drv) { drv.startup(" ", Name); });
-        step(nodeName);  // a second time, as intended
-    } else if (driverType_ == "NUVABDF1") {
-        create("ClsDriverNuvAbDf1");
-        step([&](Driver& drv) { drv.ScanRate(ScanRate); });
-        step([&](Driver& drv) { drv.startup(" ", Name); });
-        step(nodeName);
-    } else if (driverType_ == "NUVTCPIP") {
-        create("ClsDriverNUVSoftPLC");
-        step([&](Driver& drv) { drv.ScanRate(ScanRate); });
-        step(nodeName);  // before startup, as intended
-        step([&](Driver& drv) { drv.IPAddress(IPAddress); });
-        step([&](Driver& drv) { drv.Port(Port); });
-        step([&](Driver& drv) { drv.startup("NUVTCPIP", Name); });
-    } else {
-        create("ClsDriverMemTag");
-        step(nodeName);
-    }
+    // The family creates its driver and gives it its properties and startup in its own order.
+    const DriverFamily& family = DriverFamilyOf(driverType_);
+    proc.run([&] { driver_ = family.create(); });
+    family.configure(*this, [&](const std::function<void(Driver&)>& statement) {
+        proc.run([&] { statement(*requireDriver()); });
+    });
     proc.run([&] { initialised_ = true; });
 }
 

@@ -38,9 +38,9 @@ class node : public std::enable_shared_from_this<node> {
     Variant IPAddress;
     Variant Port;
 
-    // Creates and configures the driver for the type key (the upper-cased DriverName), in the
-    // fixed per-type order. Calling it again replaces the driver without shutting the old one
-    // down.
+    // Creates and configures the driver of the type key's family (the upper-cased DriverName;
+    // see DriverCatalog.h), each family in its own fixed order. Calling it again replaces the
+    // driver without shutting the old one down.
     void Init();
     void AddTag(int32_t TagID, const std::string& TagAddress);
     void RemoveTag(int32_t TagID);
