@@ -146,7 +146,7 @@ void SqliteConnection::Fail(int rc, std::string_view sql) const {
                               "'. It is already opened exclusively by another user, or you "
                               "need permission to view its data.");
         case SQLITE_CONSTRAINT:
-            if ((rc == SQLITE_CONSTRAINT_NOTNULL)) {
+            if (rc == SQLITE_CONSTRAINT_NOTNULL) {
                 // "NOT NULL constraint failed: T.F"
                 const auto dot = message.rfind('.');
                 const std::string field =

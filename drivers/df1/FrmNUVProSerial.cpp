@@ -12,8 +12,8 @@ namespace maroset {
 namespace {
 
 constexpr const char* kModule = "FrmNUVProSerial";
-constexpr uint8_t DLE = Df1Receiver::DLE, STX = Df1Receiver::STX, ETX = Df1Receiver::ETX,
-                  ENQ = Df1Receiver::ENQ, ACK = Df1Receiver::ACK, NAK = Df1Receiver::NAK;
+constexpr uint8_t DLE = Df1Receiver::DLE, ETX = Df1Receiver::ETX, ENQ = Df1Receiver::ENQ,
+                  ACK = Df1Receiver::ACK, NAK = Df1Receiver::NAK;
 // The link's internal event codes.
 constexpr int16_t kNothing = 100, kTimeOut = 101, kFrame = 102;
 
