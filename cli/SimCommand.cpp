@@ -112,8 +112,8 @@ const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
              return sim::SoftPlcSimulator::OnLoopback(o.integer("port", 0, 65535).value_or(0),
                                                       options);
          },
-         "Point a node at it: Driver NUVTCPIP, IPAddress 127.0.0.1, Port as in {}, e.g.\n"
-         "  maroset project add plant.db PLC1 NUVTCPIP --ip-address 127.0.0.1 --port PORT "
+         "Point a node at it: Driver NUVTCPIP, IPAddress 127.0.0.1, Port {port}, e.g.\n"
+         "  maroset project add plant.db PLC1 NUVTCPIP --ip-address 127.0.0.1 --port {port} "
          "--update-rate 1000"},
         {"wago",
          "WAGO coupler (Modbus/TCP)",
@@ -132,8 +132,8 @@ const std::vector<SimCommand::Kind>& SimCommand::Kinds() {
              o.port = static_cast<uint16_t>(options.integer("port", 0, 65535).value_or(0));
              return std::make_unique<sim::WagoCouplerSimulator>(o);
          },
-         "Reach it from a project node of type WAGOIO with IPAddress 127.0.0.1: couplers use port\n"
-         "502, so run the host as: maroset run PROJECT --modbus-port PORT (PORT: the port of {})"},
+         "Reach it from a node of type WAGOIO with IPAddress 127.0.0.1; couplers are always\n"
+         "reached on port 502, so run the host as: maroset run PROJECT --modbus-port {port}"},
     };
     return kinds;
 }
@@ -150,8 +150,14 @@ std::string listOfKinds() {
     return out;
 }
 
+// The connect hint with "{}" replaced by the endpoint and "{port}" by its TCP port.
 std::string replaced(std::string text, const std::string& endpoint) {
-    if (const auto at = text.find("{}"); at != std::string::npos) text.replace(at, 2, endpoint);
+    const std::string port = endpoint.substr(endpoint.rfind(':') + 1);
+    for (const auto& [key, value] :
+         {std::pair<std::string, std::string>{"{}", endpoint}, {"{port}", port}}) {
+        for (size_t at; (at = text.find(key)) != std::string::npos;)
+            text.replace(at, key.size(), value);
+    }
     return text;
 }
 
@@ -186,7 +192,9 @@ class CommandReader {
             partial_.erase(0, nl + 1);
             if (!line.empty() && line.back() == '\r') line.pop_back();
             if (line.find_first_not_of(" \t") == std::string::npos) continue;
-            std::cout << simulator_.command(line) << std::endl;
+            std::string answer = simulator_.command(line);
+            if (!answer.empty() && answer.back() == '\n') answer.pop_back();
+            std::cout << answer << std::endl;
         }
     }
 

@@ -23,7 +23,8 @@ class SimCommand {
         // Starts the simulator on the current runtime's loop, with values that change over
         // time so that a host sees them move.
         std::unique_ptr<sim::Simulator> (*start)(const CommandLine& options);
-        // How to connect a host, with "{}" standing for the simulator's endpoint.
+        // How to connect a host: "{}" stands for the simulator's endpoint, "{port}" for its TCP
+        // port.
         const char* connect;
     };
 
