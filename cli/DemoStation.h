@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <filesystem>
+#include <initializer_list>
 #include <memory>
 #include <string>
 
@@ -36,8 +37,16 @@ class DemoStation {
     virtual void stopSimulator() {}
 
   protected:
+    struct DemoTag {
+        int32_t handle;
+        const char* address;
+    };
+
     // The station's node in the loaded project (Object variable not set if it is missing).
     static std::shared_ptr<node> demoNode(nodeDB& db, const char* name);
+    // Adds the tags to the station's node, each shown as "<node>.<address>" in readable output.
+    static void addDemoTags(nodeDB& db, EventPrinter& printer, const char* name,
+                            std::initializer_list<DemoTag> tags);
 };
 
 }  // namespace maroset::cli

@@ -28,15 +28,11 @@ void Df1Station::startSimulator() {
 }
 
 void Df1Station::addTags(nodeDB& db, EventPrinter& printer) {
-    auto n = demoNode(db, kNode);
-    n->AddTag(CounterHandle, "N7:0");
-    n->AddTag(LevelHandle, "N7:1");
-    n->AddTag(PatternHandle, "N7:2");
-    n->AddTag(SetpointHandle, "N7:4");
-    printer.label(CounterHandle, "PLC.N7:0");
-    printer.label(LevelHandle, "PLC.N7:1");
-    printer.label(PatternHandle, "PLC.N7:2");
-    printer.label(SetpointHandle, "PLC.N7:4");
+    addDemoTags(db, printer, kNode,
+                {{CounterHandle, "N7:0"},
+                 {LevelHandle, "N7:1"},
+                 {PatternHandle, "N7:2"},
+                 {SetpointHandle, "N7:4"}});
 }
 
 void Df1Station::tick(nodeDB& db, int32_t second) {

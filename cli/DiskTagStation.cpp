@@ -16,9 +16,7 @@ void DiskTagStation::addNodes(const std::filesystem::path& project) {
 }
 
 void DiskTagStation::addTags(nodeDB& db, EventPrinter& printer) {
-    auto n = demoNode(db, kNode);
-    n->AddTag(BatchCountHandle, "BatchCount");
-    printer.label(BatchCountHandle, "Disk.BatchCount");
+    addDemoTags(db, printer, kNode, {{BatchCountHandle, "BatchCount"}});
 }
 
 void DiskTagStation::tick(nodeDB& db, int32_t second) {

@@ -13,15 +13,6 @@ namespace {
 
 constexpr const char* kNode = "Meter";
 
-// One tag per reply, so that each value change reports one value.
-struct DemoTag {
-    int32_t handle;
-    const char* address;
-};
-constexpr DemoTag kTags[] = {
-    {31, "01LAI1"}, {32, "01LAI6"}, {33, "01EAI17"}, {34, "02LDI1"}, {35, "01LDO1"},
-};
-
 }  // namespace
 
 IntechStation::IntechStation() = default;
@@ -44,11 +35,13 @@ void IntechStation::startSimulator() {
 }
 
 void IntechStation::addTags(nodeDB& db, EventPrinter& printer) {
-    auto n = demoNode(db, kNode);
-    for (const DemoTag& t : kTags) {
-        n->AddTag(t.handle, t.address);
-        printer.label(t.handle, std::string(kNode) + "." + t.address);
-    }
+    // One tag per reply, so that each value change reports one value.
+    addDemoTags(db, printer, kNode,
+                {{FirstHandle, "01LAI1"},
+                 {FirstHandle + 1, "01LAI6"},
+                 {FirstHandle + 2, "01EAI17"},
+                 {FirstHandle + 3, "02LDI1"},
+                 {OutputHandle, "01LDO1"}});
 }
 
 void IntechStation::tick(nodeDB& db, int32_t second) {

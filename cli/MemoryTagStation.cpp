@@ -16,11 +16,7 @@ void MemoryTagStation::addNodes(const std::filesystem::path& project) {
 }
 
 void MemoryTagStation::addTags(nodeDB& db, EventPrinter& printer) {
-    auto n = demoNode(db, kNode);
-    n->AddTag(SetpointHandle, "Setpoint");
-    n->AddTag(RunningHandle, "Running");
-    printer.label(SetpointHandle, "Memory.Setpoint");
-    printer.label(RunningHandle, "Memory.Running");
+    addDemoTags(db, printer, kNode, {{SetpointHandle, "Setpoint"}, {RunningHandle, "Running"}});
 }
 
 void MemoryTagStation::tick(nodeDB& db, int32_t second) {

@@ -19,11 +19,8 @@ void OpcStation::addNodes(const std::filesystem::path& project) {
 }
 
 void OpcStation::addTags(nodeDB& db, EventPrinter& printer) {
-    auto n = demoNode(db, kNode);
-    n->AddTag(RampHandle, "Ramp.Seconds");
-    n->AddTag(SetpointHandle, "Static.Setpoint");
-    printer.label(RampHandle, "Opc.Ramp.Seconds");
-    printer.label(SetpointHandle, "Opc.Static.Setpoint");
+    addDemoTags(db, printer, kNode,
+                {{RampHandle, "Ramp.Seconds"}, {SetpointHandle, "Static.Setpoint"}});
 }
 
 void OpcStation::tick(nodeDB& db, int32_t second) {

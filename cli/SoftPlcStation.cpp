@@ -30,13 +30,8 @@ void SoftPlcStation::startSimulator() {
 }
 
 void SoftPlcStation::addTags(nodeDB& db, EventPrinter& printer) {
-    auto n = demoNode(db, kNode);
-    n->AddTag(LevelHandle, "Level");
-    n->AddTag(FlowHandle, "Flow");
-    n->AddTag(SetpointHandle, "Setpoint");
-    printer.label(LevelHandle, "SoftPLC.Level");
-    printer.label(FlowHandle, "SoftPLC.Flow");
-    printer.label(SetpointHandle, "SoftPLC.Setpoint");
+    addDemoTags(db, printer, kNode,
+                {{LevelHandle, "Level"}, {FlowHandle, "Flow"}, {SetpointHandle, "Setpoint"}});
 }
 
 void SoftPlcStation::tick(nodeDB& db, int32_t second) {

@@ -12,18 +12,6 @@ namespace {
 
 constexpr const char* kNode = "Coupler";
 
-const struct {
-    int32_t handle;
-    const char* address;
-    const char* label;
-} kTags[] = {
-    {WagoStation::CountHandle, "IW0", "Coupler.IW0"},
-    {WagoStation::SwingHandle, "IW1", "Coupler.IW1"},
-    {WagoStation::InputBitHandle, "ID0.1", "Coupler.ID0.1"},
-    {WagoStation::OutputWordHandle, "OW0", "Coupler.OW0"},
-    {WagoStation::OutputBitHandle, "OD0.3", "Coupler.OD0.3"},
-};
-
 }  // namespace
 
 WagoStation::WagoStation() = default;
@@ -43,11 +31,12 @@ void WagoStation::startSimulator() {
 }
 
 void WagoStation::addTags(nodeDB& db, EventPrinter& printer) {
-    auto n = demoNode(db, kNode);
-    for (const auto& t : kTags) {
-        n->AddTag(t.handle, t.address);
-        printer.label(t.handle, t.label);
-    }
+    addDemoTags(db, printer, kNode,
+                {{CountHandle, "IW0"},
+                 {SwingHandle, "IW1"},
+                 {InputBitHandle, "ID0.1"},
+                 {OutputWordHandle, "OW0"},
+                 {OutputBitHandle, "OD0.3"}});
 }
 
 void WagoStation::tick(nodeDB& db, int32_t second) {
