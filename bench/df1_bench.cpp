@@ -8,6 +8,7 @@
 #include <memory>
 #include <string>
 
+#include "BenchRuntime.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Crc16Arc.h"
 #include "core/Procedure.h"
@@ -25,14 +26,6 @@ namespace {
 
 using namespace maroset;
 using namespace std::chrono_literals;
-
-std::unique_ptr<Runtime> benchRuntime(platform::VirtualEventLoop*& loopOut) {
-    auto loop = std::make_unique<platform::VirtualEventLoop>();
-    loopOut = loop.get();
-    auto clock = std::make_unique<platform::VirtualClock>(*loop, platform::ZeroDate);
-    return std::make_unique<Runtime>(std::move(loop), std::move(clock),
-                                     std::filesystem::temp_directory_path() / "maroset-bench");
-}
 
 // A read reply as the PLC sends it: words base, base+1, ... (some bytes are DLEs, doubled).
 std::string ReplyFrame(int words, int base) {
@@ -64,7 +57,7 @@ void PerByte(benchmark::State& state, size_t bytesPerIteration) {
 // byte; the driver ACKs it, decodes the words and reports every tag to a host.
 void ReplyToValueReports(benchmark::State& state) {
     platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope(benchRuntime(loop));
+    ScopedRuntime scope(bench::VirtualRuntime(&loop));
     platform::MemorySerialCable cable(*loop);
     scope->serialDevices().plug("/dev/ttyS0", cable.hostEnd());
     ClsNodeDBInterface host;
@@ -95,7 +88,7 @@ BENCHMARK(ReplyToValueReports)->Arg(1)->Arg(10)->Arg(100);
 // The receiver's steps alone, with a link that does nothing: the floor under the above.
 void ReceiverSteps(benchmark::State& state) {
     platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope(benchRuntime(loop));
+    ScopedRuntime scope(bench::VirtualRuntime(&loop));
     struct NullLink final : Df1Receiver::Link {
         void restartEndOfMessage() override {}
         void stopEndOfMessage() override {}
@@ -125,7 +118,7 @@ class NullDevice final : public platform::SerialDevice {
 // One read request of N7:0 built, framed and written, and its DLE ACK taken.
 void RequestBuiltAndFramed(benchmark::State& state) {
     platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope(benchRuntime(loop));
+    ScopedRuntime scope(bench::VirtualRuntime(&loop));
     scope->serialDevices().plug("/dev/ttyS0", std::make_shared<NullDevice>());
     FrmNUVProSerial owner("PLC");
     owner.PLCNode(1);

@@ -10,6 +10,7 @@
 #include <memory>
 #include <string>
 
+#include "BenchRuntime.h"
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
 #include "drivers/local/ClsDriverDiskTag.h"
@@ -29,10 +30,7 @@ class DiskTagSetup {
     DiskTagSetup() {
         std::string pattern = (fs::temp_directory_path() / "maroset-disktag-XXXXXX").string();
         root_ = ::mkdtemp(pattern.data());
-        auto loop = std::make_unique<platform::VirtualEventLoop>();
-        auto clock = std::make_unique<platform::VirtualClock>(*loop, platform::ZeroDate);
-        scope_ = std::make_unique<ScopedRuntime>(
-            std::make_unique<Runtime>(std::move(loop), std::move(clock), root_));
+        scope_ = std::make_unique<ScopedRuntime>(bench::VirtualRuntime(nullptr, root_));
         driver.startup("ServerName", "Line1");
         for (int i = 0; i < kTags; ++i)
             driver.AddItem(i == kTags / 2 ? "Level" : "Tag" + std::to_string(i),

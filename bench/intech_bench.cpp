@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include "BenchRuntime.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
@@ -68,15 +69,9 @@ double threadCpuSeconds() {
     return double(ts.tv_sec) + double(ts.tv_nsec) * 1e-9;
 }
 
-std::unique_ptr<Runtime> benchRuntime() {
-    return std::make_unique<Runtime>(std::make_unique<platform::VirtualEventLoop>(),
-                                     std::make_unique<platform::SystemClock>(),
-                                     std::filesystem::temp_directory_path() / "maroset-bench");
-}
-
 // Args: reply kind, and whether the values change from one reply to the next.
 void ReplyToHost(benchmark::State& state) {
-    ScopedRuntime scope(benchRuntime());
+    ScopedRuntime scope(bench::VirtualRuntime());
     auto& loop = static_cast<platform::VirtualEventLoop&>(scope->loop());
     platform::MemorySerialCable cable(loop);
     scope->serialDevices().plug("/dev/ttyS0", cable.hostEnd());

@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "BenchRuntime.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
@@ -22,19 +23,11 @@ namespace {
 using namespace maroset;
 using namespace std::chrono_literals;
 
-std::unique_ptr<Runtime> benchRuntime(platform::VirtualEventLoop*& loopOut) {
-    auto loop = std::make_unique<platform::VirtualEventLoop>();
-    loopOut = loop.get();
-    auto clock = std::make_unique<platform::VirtualClock>(*loop, platform::ZeroDate);
-    return std::make_unique<Runtime>(std::move(loop), std::move(clock),
-                                     std::filesystem::temp_directory_path() / "maroset-bench");
-}
-
 // N ramp items on one OPC node; every advance of a second changes all of them, so each
 // update is one data change of N items.
 void OpcDataChangePerItem(benchmark::State& state) {
     platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope(benchRuntime(loop));
+    ScopedRuntime scope(bench::VirtualRuntime(&loop));
     ClsNodeDBInterface host;
     int64_t received = 0;
     auto sub =
@@ -74,7 +67,7 @@ BENCHMARK(OpcDataChangePerItem)->Arg(1)->Arg(100)->Arg(10000)->Unit(benchmark::k
 // change of a single item.
 void LoopTimerTickAlone(benchmark::State& state) {
     platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope(benchRuntime(loop));
+    ScopedRuntime scope(bench::VirtualRuntime(&loop));
     platform::Timer timer(*loop);
     int64_t ticks = 0;
     auto sub = timer.Tick.subscribe([&] { ++ticks; });
@@ -88,7 +81,7 @@ BENCHMARK(LoopTimerTickAlone);
 // The memory tag path, one value per report, as bench/spine_bench.cpp measures it.
 void MemoryTagPerValue(benchmark::State& state) {
     platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope(benchRuntime(loop));
+    ScopedRuntime scope(bench::VirtualRuntime(&loop));
     ClsNodeDBInterface host;
     int64_t received = 0;
     auto sub =

@@ -4,6 +4,7 @@
 #include <memory>
 #include <vector>
 
+#include "BenchRuntime.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
@@ -15,15 +16,8 @@ namespace {
 
 using namespace maroset;
 
-std::unique_ptr<Runtime> benchRuntime() {
-    auto loop = std::make_unique<platform::VirtualEventLoop>();
-    auto clock = std::make_unique<platform::VirtualClock>(*loop, platform::ZeroDate);
-    return std::make_unique<Runtime>(std::move(loop), std::move(clock),
-                                     std::filesystem::temp_directory_path() / "maroset-bench");
-}
-
 void WriteTagRoundTrip(benchmark::State& state) {
-    ScopedRuntime scope(benchRuntime());
+    ScopedRuntime scope(bench::VirtualRuntime());
     std::vector<std::unique_ptr<ClsNodeDBInterface>> hosts;
     std::vector<Subscription> subs;
     int64_t received = 0;
