@@ -17,7 +17,6 @@
 #include "core/nodeDB.h"
 #include "drivers/df1/Df1Receiver.h"
 #include "drivers/df1/FrmNUVProSerial.h"
-#include "platform/VirtualClock.h"
 #include "platform/VirtualEventLoop.h"
 #include "platform/serial/MemorySerialCable.h"
 #include "platform/serial/SerialDevice.h"

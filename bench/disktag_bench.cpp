@@ -14,8 +14,6 @@
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
 #include "drivers/local/ClsDriverDiskTag.h"
-#include "platform/VirtualClock.h"
-#include "platform/VirtualEventLoop.h"
 
 namespace {
 

@@ -21,7 +21,6 @@
 #include "core/nodeDB.h"
 #include "drivers/intech/FrmNUVIntech.h"
 #include "drivers/intech/IntechCollector.h"
-#include "platform/SystemClock.h"
 #include "platform/VirtualEventLoop.h"
 #include "platform/serial/MemorySerialCable.h"
 

@@ -15,7 +15,6 @@
 #include "core/nodeDB.h"
 #include "drivers/opc/ClsDriverOPC.h"
 #include "platform/Timer.h"
-#include "platform/VirtualClock.h"
 #include "platform/VirtualEventLoop.h"
 
 namespace {

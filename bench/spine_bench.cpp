@@ -9,8 +9,6 @@
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
 #include "core/nodeDB.h"
-#include "platform/VirtualClock.h"
-#include "platform/VirtualEventLoop.h"
 
 namespace {
 
