@@ -2,7 +2,6 @@
 
 #include <unistd.h>
 
-#include <cctype>
 #include <cerrno>
 #include <iostream>
 
@@ -13,6 +12,7 @@
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/nodeDB.h"
+#include "lang/Strings.h"
 #include "lang/VbError.h"
 
 namespace maroset::cli {
@@ -69,11 +69,6 @@ const HostSession::Command HostSession::Commands[] = {
 };
 
 namespace {
-
-std::string lowered(std::string text) {
-    for (char& c : text) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
-    return text;
-}
 
 // Arguments of a command, with the reason a missing or malformed one is refused.
 std::string word(CommandTokenizer& args, const char* what) {
@@ -299,7 +294,7 @@ bool HostSession::execute(const std::string& text) {
     // The command word is the first run of non-blanks, whatever it holds.
     line.remove_prefix(first);
     const size_t end = std::min(line.find_first_of(" \t"), line.size());
-    const std::string name = lowered(std::string(line.substr(0, end)));
+    const std::string name = LCase(line.substr(0, end));
     CommandTokenizer args(line.substr(end));
 
     const Command* command = nullptr;

@@ -8,6 +8,7 @@
 #include "core/ValueReport.h"
 #include "lang/Conversions.h"
 #include "lang/Strings.h"
+#include "platform/LinkTrace.h"
 
 namespace maroset {
 
@@ -56,11 +57,6 @@ void yieldToPendingEvents() {
 
 bool tracing() {
     return Runtime::current().trace().enabled();
-}
-
-std::string hex2(uint8_t b) {
-    constexpr char digits[] = "0123456789ABCDEF";
-    return {digits[b >> 4], digits[b & 0x0F]};
 }
 
 }  // namespace
@@ -140,7 +136,9 @@ void ClsDriverWagoIO::connect_to_coupler() {
                     traceSource(), "connected to the coupler at " + address + ":" +
                                        std::to_string(CouplerPort) + " (TCP port " +
                                        std::to_string(Runtime::current().modbusPort()) +
-                                       "), exception status " + hex2(exceptionStatus));
+                                       "), exception status " +
+                                       platform::LinkTrace::Hex(
+                                           std::string(1, static_cast<char>(exceptionStatus))));
             }
         }
     });

@@ -1,7 +1,6 @@
 #include "platform/tcp/TcpNetwork.h"
 
-#include <cctype>
-
+#include "lang/Strings.h"
 #include "platform/tcp/HostResolver.h"
 #include "platform/tcp/SocketStream.h"
 #include "platform/tcp/TcpErrors.h"
@@ -9,9 +8,7 @@
 namespace maroset::platform {
 
 TcpNetwork::Key TcpNetwork::keyOf(const std::string& host, int32_t port) {
-    std::string lower = host;
-    for (char& c : lower) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
-    return {lower, port};
+    return {LCase(host), port};
 }
 
 void TcpNetwork::plug(const std::string& host, int32_t port, Accept accept,

@@ -1,12 +1,12 @@
 #include "sim/df1/Df1Simulator.h"
 
-#include <cctype>
 #include <charconv>
 #include <iterator>
 #include <sstream>
 #include <stdexcept>
 
 #include "core/Crc16Arc.h"
+#include "lang/Strings.h"
 
 namespace maroset::sim {
 
@@ -289,8 +289,7 @@ std::optional<std::pair<Df1Simulator::FileKey, uint16_t>> Df1Simulator::parseAdd
     if (colon == std::string_view::npos) return std::nullopt;
     size_t digits = 0;
     while (digits < colon && !(address[digits] >= '0' && address[digits] <= '9')) ++digits;
-    std::string letters(address.substr(0, digits));
-    for (char& c : letters) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
+    const std::string letters = UCase(address.substr(0, digits));
     const auto fileNumber = Number(std::string(address.substr(digits, colon - digits)));
     const auto element = Number(std::string(address.substr(colon + 1)));
     if (!fileNumber || !element || *element < 0 || *element >= int(kFileWords)) return std::nullopt;

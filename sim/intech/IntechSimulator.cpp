@@ -1,7 +1,6 @@
 #include "sim/intech/IntechSimulator.h"
 
 #include <algorithm>
-#include <cctype>
 #include <charconv>
 #include <cmath>
 #include <cstdio>
@@ -9,6 +8,7 @@
 #include <optional>
 #include <sstream>
 #include <stdexcept>
+#include "lang/Strings.h"
 
 namespace maroset::sim {
 
@@ -63,11 +63,6 @@ std::vector<std::string> words(std::string_view line) {
     std::vector<std::string> out;
     for (std::string w; in >> w;) out.push_back(w);
     return out;
-}
-
-std::string upper(std::string s) {
-    for (char& c : s) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
-    return s;
 }
 
 struct FaultName {
@@ -338,7 +333,7 @@ std::string IntechSimulator::command(std::string_view line) {
             const std::string& tag = w[1];
             IntechInstrument* st = tag.size() > 5 ? station(tag.substr(0, 2)) : nullptr;
             if (!st) return "no station for tag '" + tag + "'";
-            const std::string kind = upper(tag.substr(2, 3));
+            const std::string kind = UCase(tag.substr(2, 3));
             const auto point = integer(tag.substr(5));
             if (!point) return "tag '" + tag + "' has no point number";
             const int p = static_cast<int>(std::clamp<int64_t>(*point, -1, 1000));
