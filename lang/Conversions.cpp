@@ -197,6 +197,12 @@ bool IsNumeric(const Variant& v) {
     }
 }
 
+uint8_t CByte(const Variant& v) {
+    const int32_t n = CLng(v);
+    if (n < 0 || n > 255) throw VbError(err::Overflow);
+    return static_cast<uint8_t>(n);
+}
+
 int16_t CInt(const Variant& v) {
     if (v.type() == VarType::Integer) return v.integer();
     return static_cast<int16_t>(roundToRange(numericValue(v), -32768.0, 32767.0));

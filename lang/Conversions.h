@@ -15,6 +15,7 @@ namespace maroset {
 // (94); Empty converts to 0, "" or False. Text is read as the language reads numbers: blanks
 // around it, a sign, thousands separators, a decimal point, an exponent (E or D), and
 // "&H" / "&O" prefixes.
+uint8_t CByte(const Variant& v);  // 0..255
 int16_t CInt(const Variant& v);
 int32_t CLng(const Variant& v);
 float CSng(const Variant& v);

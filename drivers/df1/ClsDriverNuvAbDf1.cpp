@@ -3,7 +3,6 @@
 #include "core/Procedure.h"
 #include "core/Runtime.h"
 #include "core/ValueReport.h"
-#include "drivers/df1/CByte.h"
 #include "lang/Conversions.h"
 #include "lang/Strings.h"
 

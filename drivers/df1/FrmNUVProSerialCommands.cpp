@@ -4,7 +4,6 @@
 #include <string_view>
 
 #include "core/Procedure.h"
-#include "drivers/df1/CByte.h"
 #include "drivers/df1/FrmNUVProSerial.h"
 #include "lang/Conversions.h"
 #include "lang/Strings.h"

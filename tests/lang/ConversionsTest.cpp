@@ -56,6 +56,9 @@ TEST(NumberConversion, IntegersRoundHalfToEvenWithinTheirLimits) {
         {"1,234,567", 1234567},     {"&HFFFF", -1},        {"&H10000", 65536},
     };
     expectConversions(CLng, longs);
+    const Row bytes[] = {{255, 255},  {2.5, 2},   {"&H89", 137},
+                         {256, 0, 6}, {-1, 0, 6}, {"ACC", 0, 13}};
+    expectConversions(CByte, bytes);
 }
 
 // Beyond a Double overflows; below the smallest becomes zero.
