@@ -28,8 +28,6 @@ std::string ErrorDescription(int32_t number) {
             return "Invalid use of Null";
         case err::InvalidPropertyValue:
             return "Invalid property value";
-        case err::CantCreateObject:
-            return "ActiveX component can't create object";
         case err::SetNotSupportedAtRunTime:
             return "Set not supported at run time";
         case err::SetNotPermitted:

@@ -20,7 +20,6 @@ inline constexpr int32_t PathNotFound = 76;
 inline constexpr int32_t ObjectNotSet = 91;
 inline constexpr int32_t InvalidUseOfNull = 94;
 inline constexpr int32_t InvalidPropertyValue = 380;
-inline constexpr int32_t CantCreateObject = 429;
 inline constexpr int32_t SetNotSupportedAtRunTime = 382;
 inline constexpr int32_t SetNotPermitted = 387;
 inline constexpr int32_t NotSupported = 438;
