@@ -16,23 +16,15 @@
 #include "core/ScopedRuntime.h"
 #include "drivers/softplc/ClsDriverNUVSoftPLC.h"
 #include "drivers/softplc/MessageFrame.h"
-#include "platform/VirtualClock.h"
-#include "platform/VirtualEventLoop.h"
+
+#include "SoftPlcFuzzLine.h"
 
 using namespace maroset;
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-    auto loopOwner = std::make_unique<platform::VirtualEventLoop>();
-    platform::VirtualEventLoop& loop = *loopOwner;
-    auto clock = std::make_unique<platform::VirtualClock>(loop, platform::ZeroDate);
-    ScopedRuntime scope(std::make_unique<Runtime>(std::move(loopOwner), std::move(clock),
-                                                  std::filesystem::temp_directory_path()));
-    scope->tcp().setRealSockets(false);
-    std::shared_ptr<platform::MemoryTcpLink> link;
-    scope->tcp().plug("plc", 5000, [&](const std::shared_ptr<platform::MemoryTcpLink>& l) {
-        link = l;
-        l->serverEnd()->listen({{}, {}, [](std::string_view) {}, {}, {}});
-    });
+    fuzz::SoftPlcFuzzLine line;
+    platform::VirtualEventLoop& loop = *line.loop;
+    std::shared_ptr<platform::MemoryTcpLink>& link = line.link;
     int64_t reported = 0;
     ClsNodeDBInterface host;
     auto values =

@@ -110,7 +110,8 @@ bool ClsDriverNuvAbDf1::AddItem(const std::string& TagName, int16_t ClientHandle
     // Every number passes this range test; kept as it is.
     proc.run([&] {
         const int16_t element = CInt(Variant(Mid(TagName, 4)));
-        accepted = element >= 0 || element < 100;
+        accepted = element >= 0;
+        if (!accepted) accepted = element < 100;
     });
     if (!accepted) return false;
     proc.run([&] {

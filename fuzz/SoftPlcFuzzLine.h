@@ -1,0 +1,40 @@
+#pragma once
+
+#include <filesystem>
+#include <memory>
+
+#include "core/Runtime.h"
+#include "core/ScopedRuntime.h"
+#include "platform/VirtualClock.h"
+#include "platform/VirtualEventLoop.h"
+#include "platform/tcp/MemoryTcpLink.h"
+
+namespace maroset::fuzz {
+
+// A fresh runtime on a virtual loop whose only soft-PLC server is an in-memory one at
+// "plc":5000 that swallows what the client sends; `link` is its connection once a client
+// has connected.
+struct SoftPlcFuzzLine {
+    SoftPlcFuzzLine() : scope(makeRuntime(loop)) {
+        scope->tcp().setRealSockets(false);
+        scope->tcp().plug("plc", 5000, [this](const std::shared_ptr<platform::MemoryTcpLink>& l) {
+            link = l;
+            l->serverEnd()->listen({{}, {}, [](std::string_view) {}, {}, {}});
+        });
+    }
+
+    platform::VirtualEventLoop* loop = nullptr;
+    ScopedRuntime scope;
+    std::shared_ptr<platform::MemoryTcpLink> link;
+
+  private:
+    static std::unique_ptr<Runtime> makeRuntime(platform::VirtualEventLoop*& loopOut) {
+        auto owner = std::make_unique<platform::VirtualEventLoop>();
+        loopOut = owner.get();
+        auto clock = std::make_unique<platform::VirtualClock>(*owner, platform::ZeroDate);
+        return std::make_unique<Runtime>(std::move(owner), std::move(clock),
+                                         std::filesystem::temp_directory_path());
+    }
+};
+
+}  // namespace maroset::fuzz
