@@ -55,8 +55,12 @@ const LinkStatus* LinkStatusBoard::Find(std::string_view node) const {
 }
 
 LinkStatusBoard::Entry* LinkStatusBoard::entry(std::string_view node) {
+    if (lastEntry_ && node == lastName_) return lastEntry_;
     const auto it = entries_.find(UCase(std::string(node)));
-    return it == entries_.end() ? nullptr : &it->second;
+    if (it == entries_.end()) return nullptr;
+    lastName_ = std::string(node);
+    lastEntry_ = &it->second;
+    return lastEntry_;
 }
 
 LinkStatusBoard::StartScope::StartScope(LinkStatusBoard& board, std::string_view node,
@@ -94,7 +98,10 @@ void LinkStatusBoard::StartError(const VbError& error) {
 
 void LinkStatusBoard::NodeGone(std::string_view node, const void* owner) {
     const auto it = entries_.find(UCase(std::string(node)));
-    if (it != entries_.end() && it->second.owner == owner) entries_.erase(it);
+    if (it != entries_.end() && it->second.owner == owner) {
+        if (lastEntry_ == &it->second) lastEntry_ = nullptr;
+        entries_.erase(it);
+    }
 }
 
 void LinkStatusBoard::read(const platform::LinkIncident& incident) {

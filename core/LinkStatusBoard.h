@@ -74,6 +74,10 @@ class LinkStatusBoard {
 
     const platform::Clock& clock_;
     std::string starting_;  // the node being started, upper-cased; empty when none
+    // The last node looked up, as it was spelt, and its entry: reports come in runs from one
+    // node, so most look-ups skip the upper-casing and the map.
+    std::string lastName_;
+    Entry* lastEntry_ = nullptr;
     // Keyed by the upper-cased node name, as the node collection's keys are.
     std::map<std::string, Entry, std::less<>> entries_;
     Subscription reading_;
