@@ -51,6 +51,14 @@ VbArray<int32_t> HandlesFromPython(py::handle sequence) {
     return handles;
 }
 
+// The façade of a Python object, or nothing while it has none (being made or unmade).
+Host* HostOf(PyObject* self) {
+    auto* instance = reinterpret_cast<py::detail::instance*>(self);
+    const auto holder = instance->get_value_and_holder();
+    return holder.holder_constructed() ? holder.template holder<std::shared_ptr<Host>>().get()
+                                       : nullptr;
+}
+
 // The VbError class of the package's pure-Python part, kept for the life of the process.
 py::object* vbErrorType_ = nullptr;
 
@@ -182,28 +190,48 @@ void BindNodeDB(py::module_& m) {
             py::arg("Driver"), py::arg("FromSub"), py::arg("Message"))
         .def("nodes", &nodeDB::nodes, "The nodes in collection order.")
         .def_property_readonly("ValueChange",
-                               [](const std::shared_ptr<nodeDB>& db) {
+                               [](py::object self) {
+                                   auto db = py::cast<std::shared_ptr<nodeDB>>(self);
                                    return BoundEvent<ValueChangeEvent>(
-                                       db->ValueChange, ConnectionRegistry::of(db), db);
+                                       db->ValueChange, ConnectionRegistry::of(db), self);
                                })
-        .def_property_readonly("DriverError", [](const std::shared_ptr<nodeDB>& db) {
-            return BoundEvent<DriverErrorEvent>(db->DriverError, ConnectionRegistry::of(db), db);
+        .def_property_readonly("DriverError", [](py::object self) {
+            auto db = py::cast<std::shared_ptr<nodeDB>>(self);
+            return BoundEvent<DriverErrorEvent>(db->DriverError, ConnectionRegistry::of(db), self);
         });
 }
 
+// The façade's handlers may refer back to it (a lambda that uses `host`): the garbage
+// collector sees the callables through the façade and can break such cycles.
+void HostTypeSetup(PyHeapTypeObject* heapType) {
+    PyTypeObject* type = &heapType->ht_type;
+    type->tp_flags |= Py_TPFLAGS_HAVE_GC;
+    type->tp_traverse = [](PyObject* self, visitproc visit, void* arg) {
+        Py_VISIT(Py_TYPE(self));
+        if (Host* host = HostOf(self)) return host->connections().traverse(visit, arg);
+        return 0;
+    };
+    type->tp_clear = [](PyObject* self) {
+        if (Host* host = HostOf(self)) host->connections().clear();
+        return 0;
+    };
+}
+
 void BindInterface(py::module_& m) {
-    py::class_<Host, std::shared_ptr<Host>>(m, "ClsNodeDBInterface")
+    py::class_<Host, std::shared_ptr<Host>>(m, "ClsNodeDBInterface", py::custom_type_setup(&HostTypeSetup))
         .def(py::init<>())
         .def_property(
             "nodeDB", [](const Host& h) { return h.nodeDB(); },
             [](Host& h, std::shared_ptr<nodeDB> db) { h.nodeDB(std::move(db)); })
         .def_property_readonly("ValueChange",
-                               [](const std::shared_ptr<Host>& h) {
-                                   return BoundEvent<ValueChangeEvent>(h->ValueChange,
-                                                                       h->connections(), h);
+                               [](py::object self) {
+                                   Host& h = py::cast<Host&>(self);
+                                   return BoundEvent<ValueChangeEvent>(h.ValueChange,
+                                                                       h.connections(), self);
                                })
-        .def_property_readonly("DriverError", [](const std::shared_ptr<Host>& h) {
-            return BoundEvent<DriverErrorEvent>(h->DriverError, h->connections(), h);
+        .def_property_readonly("DriverError", [](py::object self) {
+            Host& h = py::cast<Host&>(self);
+            return BoundEvent<DriverErrorEvent>(h.DriverError, h.connections(), self);
         });
 }
 
