@@ -18,13 +18,16 @@ py::object& messageBox_() {
 }
 
 std::pair<std::string, int> PortKey(py::handle key) {
+    std::string node;
+    py::handle port = key;
     if (py::isinstance<py::tuple>(key) && py::len(key) == 2) {
         const auto pair = py::reinterpret_borrow<py::tuple>(key);
-        return {TextFromPython(py::str(pair[0])), py::cast<int>(pair[1])};
+        node = TextFromPython(py::str(pair[0]));
+        port = pair[1];
     }
-    if (!py::isinstance<py::int_>(key))
+    if (!py::isinstance<py::int_>(port))
         throw py::key_error("a serial port is N or (node, N), N a whole number");
-    return {std::string(), py::cast<int>(key)};
+    return {node, py::cast<int>(port)};
 }
 
 }  // namespace

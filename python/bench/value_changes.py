@@ -1,0 +1,47 @@
+"""Value changes per second delivered to a Python callback.
+
+Through the library: one-tag reports raised by the nodeDB, as a driver raises them, passed on
+by the façade and handed to the callback as lists. Reference: a bare pybind11 loop calling the
+same callback with the same lists. Both run here, in this process, so the ratio does not
+depend on the machine.
+
+    PYTHONPATH=build/release/python python3 python/bench/value_changes.py [REPORTS]
+"""
+
+import sys
+import time
+
+import _maroset_bench
+import maroset
+
+
+def best_rate(run, reports, rounds=5):
+    best = 0.0
+    for _ in range(rounds):
+        start = time.perf_counter()
+        run(reports)
+        best = max(best, reports / (time.perf_counter() - start))
+    return best
+
+
+def main():
+    reports = int(sys.argv[1]) if len(sys.argv) > 1 else 200_000
+    received = 0
+
+    def callback(handles, count, values):
+        nonlocal received
+        received += count
+
+    host = maroset.ClsNodeDBInterface()
+    host.ValueChange.connect(callback)
+    db = host.nodeDB
+    library = best_rate(lambda n: maroset._maroset._raise_value_changes(db, n), reports)
+    bare = best_rate(lambda n: _maroset_bench.bare(callback, n), reports)
+    assert received == 2 * 5 * reports
+    print(f"through the library : {library:12,.0f} value changes/s")
+    print(f"bare pybind11 loop  : {bare:12,.0f} value changes/s")
+    print(f"ratio               : {library / bare:.2f}x (goal: 0.7x or more)")
+
+
+if __name__ == "__main__":
+    main()
