@@ -10,13 +10,17 @@ namespace maroset::python {
 
 namespace {
 
+// Calls without building an argument tuple: this is the path of every value change.
 template <class... Args>
-void CallReporting(const py::function& callable, Args&&... args) {
-    try {
-        callable(std::forward<Args>(args)...);
-    } catch (py::error_already_set& e) {
-        e.discard_as_unraisable(callable);
+void CallReporting(const py::function& callable, const Args&... args) {
+    PyObject* const argv[] = {args.ptr()...};
+    PyObject* result = PyObject_Vectorcall(callable.ptr(), argv, sizeof...(Args), nullptr);
+    if (result) {
+        Py_DECREF(result);
+        return;
     }
+    py::error_already_set error;
+    error.discard_as_unraisable(callable);
 }
 
 }  // namespace
@@ -24,7 +28,7 @@ void CallReporting(const py::function& callable, Args&&... args) {
 ValueChangeEvent::Handler PythonHandler(ValueChangeEvent&, py::function callable) {
     return [callable = std::move(callable)](VbArray<int32_t>& TagIDs, int16_t NumItems,
                                             VbArray<Variant>& Values) {
-        CallReporting(callable, ToList(TagIDs), NumItems, ToList(Values));
+        CallReporting(callable, ToList(TagIDs), py::int_(NumItems), ToList(Values));
     };
 }
 
