@@ -66,8 +66,8 @@ void TranslateVbError(std::exception_ptr pending) {
     try {
         if (pending) std::rethrow_exception(pending);
     } catch (const VbError& e) {
-        const py::object error = (*vbErrorType_)(e.number(), TextToPython(e.description()),
-                                                 TextToPython(e.source()));
+        const py::object error =
+            (*vbErrorType_)(e.number(), TextToPython(e.description()), TextToPython(e.source()));
         PyErr_SetObject(vbErrorType_->ptr(), error.ptr());
     }
 }
@@ -122,8 +122,7 @@ void BindNode(py::module_& m) {
             "RemoveTag", [](node& n, py::handle TagID) { n.RemoveTag(Long(TagID)); },
             py::arg("TagID"))
         .def(
-            "ReadTag", [](node& n, py::handle TagID) { n.ReadTag(Long(TagID)); },
-            py::arg("TagID"))
+            "ReadTag", [](node& n, py::handle TagID) { n.ReadTag(Long(TagID)); }, py::arg("TagID"))
         .def(
             "WriteTag",
             [](node& n, py::handle TagID, py::handle value) {
@@ -142,7 +141,8 @@ void BindNode(py::module_& m) {
             },
             py::arg("TagID"), py::arg("Values"))
         .def("__repr__", [](const node& n) {
-            return py::str("<maroset.node {!r} ({!r})>").format(TextToPython(n.Name), ToPython(n.DriverName));
+            return py::str("<maroset.node {!r} ({!r})>")
+                .format(TextToPython(n.Name), ToPython(n.DriverName));
         });
 }
 
@@ -218,7 +218,8 @@ void HostTypeSetup(PyHeapTypeObject* heapType) {
 }
 
 void BindInterface(py::module_& m) {
-    py::class_<Host, std::shared_ptr<Host>>(m, "ClsNodeDBInterface", py::custom_type_setup(&HostTypeSetup))
+    py::class_<Host, std::shared_ptr<Host>>(m, "ClsNodeDBInterface",
+                                            py::custom_type_setup(&HostTypeSetup))
         .def(py::init<>())
         .def_property(
             "nodeDB", [](const Host& h) { return h.nodeDB(); },

@@ -49,7 +49,8 @@ py::str TextToPython(const std::string& bytes) {
 }
 
 std::string TextFromPython(py::handle text) {
-    const py::object encoded = Steal(PyUnicode_AsEncodedString(text.ptr(), "utf-8", "surrogateescape"));
+    const py::object encoded =
+        Steal(PyUnicode_AsEncodedString(text.ptr(), "utf-8", "surrogateescape"));
     return std::string(PyBytes_AS_STRING(encoded.ptr()),
                        static_cast<size_t>(PyBytes_GET_SIZE(encoded.ptr())));
 }
@@ -57,14 +58,16 @@ std::string TextFromPython(py::handle text) {
 py::list ToList(const VbArray<int32_t>& items) {
     py::list list(static_cast<size_t>(items.size()));
     size_t i = 0;
-    for (const int32_t item : items) PyList_SET_ITEM(list.ptr(), i++, Steal(PyLong_FromLong(item)).release().ptr());
+    for (const int32_t item : items)
+        PyList_SET_ITEM(list.ptr(), i++, Steal(PyLong_FromLong(item)).release().ptr());
     return list;
 }
 
 py::list ToList(const VbArray<Variant>& items) {
     py::list list(static_cast<size_t>(items.size()));
     size_t i = 0;
-    for (const Variant& item : items) PyList_SET_ITEM(list.ptr(), i++, ToPython(item).release().ptr());
+    for (const Variant& item : items)
+        PyList_SET_ITEM(list.ptr(), i++, ToPython(item).release().ptr());
     return list;
 }
 
@@ -104,11 +107,13 @@ Variant FromPython(py::handle value) {
     if (PyFloat_Check(object)) return Variant(PyFloat_AS_DOUBLE(object));
     if (PyUnicode_Check(object)) return Variant(TextFromPython(value));
     if (PyBytes_Check(object))
-        return Variant(std::string(PyBytes_AS_STRING(object), static_cast<size_t>(PyBytes_GET_SIZE(object))));
+        return Variant(
+            std::string(PyBytes_AS_STRING(object), static_cast<size_t>(PyBytes_GET_SIZE(object))));
     if (PyByteArray_Check(object))
         return Variant(std::string(PyByteArray_AS_STRING(object),
                                    static_cast<size_t>(PyByteArray_GET_SIZE(object))));
     if (PyList_Check(object) || PyTuple_Check(object)) return Variant(ArrayFromPython(value, 0));
+    // datetime.datetime joins here as a Date once the run-time layer has that kind.
     // Other integers (NumPy's, IntEnum's) and other numbers take their plain form.
     if (PyIndex_Check(object)) return IntegerFromPython(Steal(PyNumber_Index(object)));
     if (PyObject_HasAttrString(object, "__float__")) {

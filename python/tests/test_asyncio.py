@@ -3,7 +3,6 @@
 import asyncio
 
 import maroset
-from conftest import run_until
 
 
 def test_project_changes_arrive_in_async_for(softplc):

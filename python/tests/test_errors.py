@@ -15,7 +15,8 @@ def test_errors_carry_number_description_and_source(host, tmp_path):
     db = host.nodeDB
     db.AddNode("Mem", "MEMTAG")
     e = error_of(lambda: db.AddNode("MEM", "MEMTAG"))
-    assert (e.number, e.description) == (457, "This key is already associated with an element of this collection")
+    assert e.number == 457
+    assert e.description == "This key is already associated with an element of this collection"
     assert isinstance(e, Exception) and "457" in str(e)
     e = error_of(lambda: db.RemoveNode("Pump"))
     assert e.number == 5 and e.source

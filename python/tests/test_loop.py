@@ -1,11 +1,12 @@
 """The loop: run_for, run and stop, the interpreter lock, the runtime's settings."""
 
+import os
+import signal
 import threading
 
 import pytest
 
 import maroset
-from conftest import run_until
 
 
 def test_run_for_checks_its_argument():
@@ -13,6 +14,15 @@ def test_run_for_checks_its_argument():
         with pytest.raises(ValueError):
             maroset.run_for(bad)
     maroset.run_for(0)
+
+
+def test_ctrl_c_ends_a_run_that_sleeps():
+    timer = threading.Timer(0.1, os.kill, (os.getpid(), signal.SIGINT))
+    timer.start()
+    with pytest.raises(KeyboardInterrupt):
+        maroset.run()
+    timer.join()
+    maroset.run_for(0.01)  # and the loop runs again
 
 
 def test_other_threads_run_while_the_loop_sleeps():

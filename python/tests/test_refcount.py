@@ -68,7 +68,8 @@ def test_a_facade_dropped_while_the_loop_runs(softplc):
 
 def test_a_callback_that_refers_to_its_facade_does_not_keep_it_alive():
     host = maroset.ClsNodeDBInterface()
-    host.ValueChange.connect(lambda h, n, v: host.nodeDB.count())
+    # The default argument holds the façade itself, not a cell that `del` empties.
+    host.ValueChange.connect(lambda h, n, v, host=host: host.nodeDB.count())
     watch = weakref.ref(host)
     del host
     gc.collect()

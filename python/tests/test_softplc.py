@@ -1,6 +1,5 @@
 """A NUVTCPIP node against the soft-PLC simulator on loopback, in this process."""
 
-import maroset
 from conftest import run_until
 
 
