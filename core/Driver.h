@@ -30,6 +30,8 @@ class Driver {
     virtual void ScanRate(const Variant& v) { scanRate_ = v; }
     virtual std::string NodeName() const { return nodeName_; }
     virtual void NodeName(const std::string& v) { nodeName_ = v; }
+    // The node this driver serves, as NodeName last set it: what its reports are filed under.
+    const std::string& servedNode() const { return nodeName_; }
     virtual Variant OPCTopic() const { return opcTopic_; }
     virtual void OPCTopic(const Variant& v) { opcTopic_ = v; }
     virtual Variant ServerName() const { return serverName_; }

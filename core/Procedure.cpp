@@ -17,7 +17,8 @@ void Procedure::stamp(VbError& e) const {
 }
 
 int16_t Procedure::resume(const VbError& e) {
-    if (trap_ == Trap::ResumeNext) return 1;
+    if (trap_ == Trap::ResumeNext) return 1;  // errors expected and ignored by design
+    Runtime::current().linkStatus().StartError(e);  // a node starting: its driver did not
     return Runtime::current().trap().HandleError(module_, name_, e);
 }
 

@@ -6,9 +6,12 @@
 #include <string>
 
 #include "core/ErrorTrap.h"
+#include "core/LinkStatusBoard.h"
+#include "core/ReportTap.h"
 #include "platform/Clock.h"
 #include "platform/EventLoop.h"
 #include "platform/FileSystem.h"
+#include "platform/LinkIncidents.h"
 #include "platform/LinkTrace.h"
 #include "platform/opc/OpcServerRegistry.h"
 #include "platform/serial/SerialDevices.h"
@@ -68,6 +71,13 @@ class Runtime {
     // The link trace drivers write to (off unless a host gives it a sink).
     platform::LinkTrace& trace() { return trace_; }
 
+    // The one stream of link incidents that drivers and port owners report to.
+    platform::LinkIncidents& incidents() { return incidents_; }
+    // Every value and error report, by node, for observers beside the host.
+    ReportTap& reports() { return reports_; }
+    // The link status of every started node, fed by the two above.
+    LinkStatusBoard& linkStatus() { return linkStatus_; }
+
     // The TCP port used for a coupler's Modbus port 502 (502 unless mapped, for simulators
     // and tests that run without privileges).
     int modbusPort() const { return modbusPort_; }
@@ -90,6 +100,9 @@ class Runtime {
     platform::SerialDevices serialDevices_;
     platform::TcpNetwork tcp_;
     platform::LinkTrace trace_;
+    platform::LinkIncidents incidents_{*clock_};
+    ReportTap reports_;
+    LinkStatusBoard linkStatus_{incidents_, reports_, *clock_};
     // Keyed by upper-cased node name ("" for every node) and port.
     std::map<std::pair<std::string, int>, std::string> serialPorts_;
     int modbusPort_ = 502;

@@ -2,6 +2,7 @@
 
 #include "core/DriverCatalog.h"
 #include "core/Procedure.h"
+#include "core/Runtime.h"
 #include "lang/Conversions.h"
 #include "lang/Strings.h"
 
@@ -26,6 +27,7 @@ node::~node() {
     } catch (...) {
         // Nothing can reach a caller from here.
     }
+    Runtime::current().linkStatus().NodeGone(Name, this);
 }
 
 std::shared_ptr<Driver> node::requireDriver() const {
@@ -37,12 +39,24 @@ std::shared_ptr<Driver> node::requireDriver() const {
 void node::Init() {
     const auto self = weak_from_this().lock();
     Procedure proc(kModule, "Init");
-    proc.run([&] { driverType_ = UCase(CStr(DriverName)); });
+    LinkStatusBoard::StartScope starting(Runtime::current().linkStatus(), Name, this);
+    // A step that fails is told to the link status, then goes its usual way (to the host, or
+    // to the trap's handler, which tells it too: once more does no harm).
+    auto told = [&](auto&& statement) {
+        try {
+            statement();
+        } catch (const VbError& e) {
+            Runtime::current().linkStatus().StartError(e);
+            throw;
+        }
+    };
+    proc.run([&] { told([&] { driverType_ = UCase(CStr(DriverName)); }); });
     // The family creates its driver and gives it its properties and startup in its own order.
     const DriverFamily& family = DriverFamilyOf(driverType_);
-    proc.run([&] { driver_ = family.create(); });
+    starting.typeKnown(family.typeKey);
+    proc.run([&] { told([&] { driver_ = family.create(); }); });
     family.configure(*this, [&](const std::function<void(Driver&)>& statement) {
-        proc.run([&] { statement(*requireDriver()); });
+        proc.run([&] { told([&] { statement(*requireDriver()); }); });
     });
     proc.run([&] { initialised_ = true; });
 }

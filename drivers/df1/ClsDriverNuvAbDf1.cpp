@@ -212,7 +212,7 @@ void ClsDriverNuvAbDf1::NUVSerial_ReadComplete(VbArray<Variant>&) {
             });
         }
     }
-    if (handles.size() > 0) proc.run([&] { ReportValues(handles, values); });
+    if (handles.size() > 0) proc.run([&] { ReportValues(*this, handles, values); });
 }
 
 void ClsDriverNuvAbDf1::NUVSerial_Complete(const std::string& text, uint8_t level) {

@@ -178,7 +178,7 @@ void ClsDriverIntech::NUVIntech_ReadComplete(VbArray<Variant>& TagNames, VbArray
         }
     });
     proc.run([&] {
-        if (k > 0) ReportValues(handles, values);
+        if (k > 0) ReportValues(*this, handles, values);
     });
 }
 

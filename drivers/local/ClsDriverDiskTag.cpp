@@ -104,7 +104,7 @@ int32_t ClsDriverDiskTag::WriteItem(int32_t ClientHandle, const Variant& data) {
     // disk.
     proc.run([&] { use(rs).Update(); });
     // The written value goes back, not the text stored.
-    proc.run([&] { ReportValue(ClientHandle, data); });
+    proc.run([&] { ReportValue(*this, ClientHandle, data); });
     return 0;
 }
 
@@ -148,7 +148,7 @@ int32_t ClsDriverDiskTag::ReadItem(int32_t ClientHandle) {
         Variant value;
         proc.run([&] { use(rs).MoveFirst(); });
         proc.run([&] { value = use(rs).Fields("Tagvalue"); });
-        proc.run([&] { ReportValue(ClientHandle, value); });
+        proc.run([&] { ReportValue(*this, ClientHandle, value); });
     }
     return 0;
 }

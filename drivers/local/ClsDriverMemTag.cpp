@@ -26,7 +26,7 @@ std::string ClsDriverMemTag::GetErrorString(int32_t&) {
 
 int32_t ClsDriverMemTag::WriteItem(int32_t ClientHandle, const Variant& data) {
     Procedure proc(kModule, "WriteItem");
-    proc.run([&] { ReportValue(ClientHandle, data); });
+    proc.run([&] { ReportValue(*this, ClientHandle, data); });
     return 0;
 }
 

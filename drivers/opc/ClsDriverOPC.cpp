@@ -37,12 +37,11 @@ std::string joinText(const Variant& v) {
 }
 
 // The value report of an event: the server's arrays as they came, with its count.
-void NewValue(VbArray<int32_t>& handles, int32_t numItems, VbArray<Variant>& values) {
+void NewValue(const Driver& from, VbArray<int32_t>& handles, int32_t numItems,
+              VbArray<Variant>& values) {
     // The count goes up as a 16-bit integer: Overflow beyond, as CInt would say.
     if (numItems < INT16_MIN || numItems > INT16_MAX) throw VbError(err::Overflow);
-    const auto count = static_cast<int16_t>(numItems);
-    if (auto db = Runtime::current().hiddenInterface().nodeDB())
-        db->NewValue(handles, count, values);
+    ReportValues(from, handles, static_cast<int16_t>(numItems), values);
 }
 
 }  // namespace
@@ -142,7 +141,7 @@ void ClsDriverOPC::PostMessage(int32_t lError, const std::string& FromSub) {
     proc.run([&] {
         if (InStr(text, "\r\n") > 0) text = Left(text, static_cast<int32_t>(text.size()) - 2);
     });
-    proc.run([&] { ReportError(NodeName(), FromSub, "PostMessage...: " + text); });
+    proc.run([&] { ReportError(*this, NodeName(), FromSub, "PostMessage...: " + text); });
 }
 
 void ClsDriverOPC::IsActive(bool NewValue) {
@@ -231,7 +230,7 @@ bool ClsDriverOPC::AddItem(const std::string& TagName, int16_t ClientHandle) {
                 return "AddItem " + itemIDs(1) + " (handle " + std::to_string(ClientHandle) +
                        "): " + platform::opc::HexCode(code) + " " + text;
             });
-            ReportError(kDriver, "ClsDriverOPC.AddItem", "TagName: " + TagName + " Error: " + text);
+            ReportError(*this, kDriver, "ClsDriverOPC.AddItem", "TagName: " + TagName + " Error: " + text);
         });
     } else {
         // A handle of 0 or below has no slot: this fails, and the item stays in the group.
@@ -274,7 +273,7 @@ bool ClsDriverOPC::AddItems(int16_t NumItems, VbArray<std::string>& TagNames,
                            std::to_string(ClientHandles(i)) + "): " + platform::opc::HexCode(own) +
                            " " + GetErrorString(own);
                 });
-                ReportError(kDriver, "ClsDriverOPC.AddItems", " Error: " + text);
+                ReportError(*this, kDriver, "ClsDriverOPC.AddItems", " Error: " + text);
             });
         } else {
             proc.run([&] { serverHandles_(ClientHandles(i)) = handles(i); });
@@ -304,7 +303,7 @@ int32_t ClsDriverOPC::ReadItem(int32_t ClientHandle) {
                 return "ReadItem handle " + std::to_string(ClientHandle) + ": " +
                        platform::opc::HexCode(code) + " " + text;
             });
-            ReportError(kDriver, "ClsDriverOPC.ReadItem",
+            ReportError(*this, kDriver, "ClsDriverOPC.ReadItem",
                         "ClientHandle: " + std::to_string(ClientHandle) + " Error: " + text);
         });
     }
@@ -348,7 +347,7 @@ void ClsDriverOPC::MyOPCGroup_DataChange(int32_t, int32_t NumItems, VbArray<int3
     trace([&] { return "DataChange " + std::to_string(NumItems) + " items"; });
     // Qualities and time stamps stay here. Nothing of this driver is touched after the
     // report: a host may drop the node while it handles it.
-    proc.run([&] { NewValue(ClientHandles, NumItems, ItemValues); });
+    proc.run([&] { NewValue(*this, ClientHandles, NumItems, ItemValues); });
 }
 
 void ClsDriverOPC::MyOPCGroup_AsyncReadComplete(int32_t, int32_t NumItems,
@@ -368,7 +367,7 @@ void ClsDriverOPC::MyOPCGroup_AsyncReadComplete(int32_t, int32_t NumItems,
     trace([&] { return "AsyncReadComplete " + std::to_string(NumItems) + " items"; });
     // Per-item errors are not looked at, and a failing report is ignored.
     Procedure report(kModule, "MyOPCGroup_AsyncReadComplete", Procedure::Trap::ResumeNext);
-    report.run([&] { NewValue(ClientHandles, NumItems, ItemValues); });
+    report.run([&] { NewValue(*this, ClientHandles, NumItems, ItemValues); });
 }
 
 void ClsDriverOPC::MyOPCGroup_AsyncWriteComplete(int32_t, int32_t NumItems,

@@ -261,7 +261,7 @@ void ClsDriverNUVSoftPLC::Client_DataArrival(const std::string& MessageID,
     }
     VbArray<int32_t> TagIDs(1, std::move(handles));
     VbArray<Variant> Values(1, std::move(values));
-    ReportValues(TagIDs, Values);
+    ReportValues(*this, TagIDs, Values);
 }
 
 }  // namespace maroset

@@ -440,7 +440,7 @@ void ClsDriverWagoIO::scan() {
             });
         }
     }
-    if (n > 0) proc.run([&] { ReportValues(handles, values); });
+    if (n > 0) proc.run([&] { ReportValues(*this, handles, values); });
 }
 
 }  // namespace maroset

@@ -6,13 +6,17 @@
 
 #include "core/Runtime.h"
 #include "core/ValueReport.h"
+#include "drivers/local/ClsDriverMemTag.h"
 #include "support/HostRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
 namespace {
 
-class HostFacadeTest : public test::RuntimeFixture {};
+class HostFacadeTest : public test::RuntimeFixture {
+  protected:
+    ClsDriverMemTag reporter;  // the driver the reports below come from
+};
 
 TEST_F(HostFacadeTest, EveryFacadeSharesTheOneNodeDBAndSeesEveryEvent) {
     test::HostRecorder first;
@@ -22,7 +26,7 @@ TEST_F(HostFacadeTest, EveryFacadeSharesTheOneNodeDBAndSeesEveryEvent) {
 
     first.host.nodeDB()->AddNode("M", "MEMTAG");
     first.host.nodeDB()->getNode("M")->WriteTag("7", 3.5);
-    ReportError("Test Driver", "ClsTest.Run", "boom");
+    ReportError(reporter, "Test Driver", "ClsTest.Run", "boom");
     for (const auto* rec : {&first, &second}) {
         ASSERT_EQ(rec->changes.size(), 1u);
         EXPECT_EQ(rec->changes[0].handles, std::vector<int32_t>{7});
@@ -42,14 +46,14 @@ TEST_F(HostFacadeTest, HostReceivesTheDriversOwnArrays) {
             EXPECT_EQ(&gotValues, &values);
             EXPECT_EQ(n, 2);
         });
-    ReportValues(ids, values);
+    ReportValues(reporter, ids, values);
     ASSERT_EQ(rec.changes.size(), 1u);
     EXPECT_EQ(rec.changes[0].handlesLower, 1);
     EXPECT_EQ(rec.changes[0].valuesLower, 1);
 }
 
 TEST_F(HostFacadeTest, ReportBeforeAnyFacadeSucceedsAndReleasingAFacadeStopsNothing) {
-    EXPECT_NO_THROW(ReportValue(1, 2));  // the hidden façade and nodeDB are made now
+    EXPECT_NO_THROW(ReportValue(reporter, 1, 2));  // the hidden façade and nodeDB are made now
     runtime().nodes()->AddNode("M", "MEMTAG");
     { test::HostRecorder gone; }
     test::HostRecorder late;
@@ -64,8 +68,8 @@ TEST_F(HostFacadeTest, FacadeReleasedInsideItsOwnHandler) {
     test::HostRecorder other;
     auto sub = doomed->ValueChange.subscribe(
         [&](VbArray<int32_t>&, int16_t, VbArray<Variant>&) { doomed.reset(); });
-    ReportValue(1, 1);
-    ReportValue(2, 2);
+    ReportValue(reporter, 1, 1);
+    ReportValue(reporter, 2, 2);
     EXPECT_FALSE(doomed);
     EXPECT_EQ(other.changes.size(), 2u);
 }
@@ -74,7 +78,7 @@ TEST_F(HostFacadeTest, AssigningAnotherNodeDBMovesTheEvents) {
     test::HostRecorder rec;
     auto own = std::make_shared<nodeDB>();
     rec.host.nodeDB(own);
-    ReportValue(1, 1);  // through the process-wide nodeDB
+    ReportValue(reporter, 1, 1);  // through the process-wide nodeDB
     EXPECT_TRUE(rec.changes.empty());
     VbArray<int32_t> ids(1, 1);
     VbArray<Variant> values(1, 1);
