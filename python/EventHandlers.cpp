@@ -39,4 +39,21 @@ DriverErrorEvent::Handler PythonHandler(DriverErrorEvent&, py::function callable
     };
 }
 
+ReportValuesEvent::Handler PythonHandler(ReportValuesEvent&, py::function callable) {
+    return [callable = std::move(callable)](std::string_view node, const VbArray<int32_t>& TagIDs,
+                                            int16_t NumItems, const VbArray<Variant>& Values) {
+        CallReporting(callable, TextToPython(std::string(node)), ToList(TagIDs), py::int_(NumItems),
+                      ToList(Values));
+    };
+}
+
+ReportErrorsEvent::Handler PythonHandler(ReportErrorsEvent&, py::function callable) {
+    return
+        [callable = std::move(callable)](std::string_view node, const std::string& Driver,
+                                         const std::string& FromSub, const std::string& Message) {
+            CallReporting(callable, TextToPython(std::string(node)), TextToPython(Driver),
+                          TextToPython(FromSub), TextToPython(Message));
+        };
+}
+
 }  // namespace maroset::python

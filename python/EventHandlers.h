@@ -2,6 +2,7 @@
 
 #include <pybind11/pybind11.h>
 
+#include "core/ReportTap.h"
 #include "core/nodeDB.h"
 
 namespace maroset::python {
@@ -15,5 +16,12 @@ namespace maroset::python {
 // while it sleeps.
 ValueChangeEvent::Handler PythonHandler(ValueChangeEvent& event, pybind11::function callable);
 DriverErrorEvent::Handler PythonHandler(DriverErrorEvent& event, pybind11::function callable);
+
+// The runtime's reports by node: (node, handles, count, values) and (node, driver, source,
+// message).
+using ReportValuesEvent = decltype(ReportTap::Values);
+using ReportErrorsEvent = decltype(ReportTap::Errors);
+ReportValuesEvent::Handler PythonHandler(ReportValuesEvent& event, pybind11::function callable);
+ReportErrorsEvent::Handler PythonHandler(ReportErrorsEvent& event, pybind11::function callable);
 
 }  // namespace maroset::python

@@ -2,7 +2,6 @@
 // name and its arguments in the same order, their events, the runtime's settings and loop,
 // and the simulators.
 
-#include <pybind11/functional.h>
 #include <pybind11/pybind11.h>
 #include <pybind11/stl.h>
 
@@ -15,6 +14,7 @@
 #include "LoopControl.h"
 #include "RuntimeSettings.h"
 #include "VariantConversion.h"
+#include "core/Runtime.h"
 #include "core/node.h"
 #include "core/nodeDB.h"
 #include "lang/Conversions.h"
@@ -236,6 +236,23 @@ void BindInterface(py::module_& m) {
         });
 }
 
+// The runtime's reports by node (`maroset.reports`): its handlers live as long as the process.
+void BindReportTap(py::module_& m) {
+    static auto* connections = new ConnectionList();
+    py::class_<ReportTap>(m, "ReportTap")
+        .def_property_readonly("Values",
+                               [](ReportTap& tap) {
+                                   return BoundEvent<ReportValuesEvent>(tap.Values, *connections,
+                                                                        py::none());
+                               })
+        .def_property_readonly("Errors", [](ReportTap& tap) {
+            return BoundEvent<ReportErrorsEvent>(tap.Errors, *connections, py::none());
+        });
+    BindEvent<ReportValuesEvent>(m, "ReportValuesEvent");
+    BindEvent<ReportErrorsEvent>(m, "ReportErrorsEvent");
+    m.attr("reports") = py::cast(&Runtime::current().reports(), py::return_value_policy::reference);
+}
+
 void BindRuntime(py::module_& m) {
     using Ports = RuntimeSettings::SerialPorts;
     py::class_<Ports>(m, "SerialPorts")
@@ -333,6 +350,7 @@ PYBIND11_MODULE(_maroset, m) {
     BindNodeDB(m);
     BindInterface(m);
     BindRuntime(m);
+    BindReportTap(m);
     BindLoop(m);
     BindSimulators(m);
 }

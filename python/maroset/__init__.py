@@ -8,12 +8,16 @@ from ._maroset import (
     DriverErrorEvent,
     Empty,
     EmptyType,
+    ReportErrorsEvent,
+    ReportTap,
+    ReportValuesEvent,
     RuntimeSettings,
     SerialPorts,
     ValueChangeEvent,
     node,
     nodeDB,
     pump,
+    reports,
     run,
     run_for,
     runtime,
@@ -25,6 +29,7 @@ from ._project import Change, Project
 
 __all__ = [
     "Attachment", "Change", "ClsNodeDBInterface", "Connection", "DriverErrorEvent", "Empty",
-    "EmptyType", "Project", "RuntimeSettings", "SerialPorts", "ValueChangeEvent", "VbError",
-    "attach", "node", "nodeDB", "pump", "run", "run_for", "runtime", "sim", "stop",
+    "EmptyType", "Project", "ReportErrorsEvent", "ReportTap", "ReportValuesEvent",
+    "RuntimeSettings", "SerialPorts", "ValueChangeEvent", "VbError", "attach", "node", "nodeDB",
+    "pump", "reports", "run", "run_for", "runtime", "sim", "stop",
 ]

@@ -28,6 +28,27 @@ class DriverErrorEvent:
     @property
     def handler_count(self) -> int: ...
 
+class ReportValuesEvent:
+    def connect(
+        self, handler: Callable[[str, List[int], int, List[Value]], object]) -> Connection: ...
+    @property
+    def handler_count(self) -> int: ...
+
+class ReportErrorsEvent:
+    def connect(self, handler: Callable[[str, str, str, str], object]) -> Connection: ...
+    @property
+    def handler_count(self) -> int: ...
+
+class ReportTap:
+    """Every report a driver makes, with the name of its node, told just before the
+    façades' ValueChange and DriverError."""
+    @property
+    def Values(self) -> ReportValuesEvent: ...
+    @property
+    def Errors(self) -> ReportErrorsEvent: ...
+
+reports: ReportTap
+
 class node:
     NodeID: int
     Name: str

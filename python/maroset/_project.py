@@ -4,15 +4,15 @@ from __future__ import annotations
 
 import asyncio
 import os
-from typing import AsyncIterator, Dict, NamedTuple, Optional, Union
+from typing import AsyncIterator, NamedTuple, Optional, Union
 
 from ._asyncio import attach
-from ._maroset import ClsNodeDBInterface, node
+from ._maroset import ClsNodeDBInterface, node, reports
 
 
 class Change(NamedTuple):
-    """One tag's new value: the node that reported it (None where it is not known), the
-    tag's handle and the value."""
+    """One tag's new value: the node whose driver reported it (None when the node is gone
+    by the time the change is taken), the tag's handle and the value."""
 
     node: Optional[node]
     handle: int
@@ -21,17 +21,12 @@ class Change(NamedTuple):
 
 class Project:
     """`with maroset.Project("plant.db") as p:` loads the project's nodes (AddAllNodes) and
-    starts scanning; leaving the block stops scanning and removes the nodes.
-
-    Value reports carry handles only. `changes()` names the node of a handle added through
-    `add_tag` (when no other node has a tag with that handle); for other handles the node
-    is None."""
+    starts scanning; leaving the block stops scanning and removes the nodes."""
 
     def __init__(self, path: Union[str, os.PathLike], *, start: bool = True) -> None:
         self.path = path
         self.start = start
         self.host: Optional[ClsNodeDBInterface] = None
-        self._owners: Dict[int, Optional[node]] = {}
 
     def __enter__(self) -> "Project":
         self.host = ClsNodeDBInterface()
@@ -50,7 +45,6 @@ class Project:
             self.db.StopScanning()
         finally:
             self.db.RemoveAllNodes()
-            self._owners.clear()
 
     def node(self, name: str) -> node:
         """The node of that name; KeyError when the project has none."""
@@ -62,27 +56,26 @@ class Project:
     __getitem__ = node
 
     def add_tag(self, node_name: str, handle: int, address: str) -> None:
-        """`AddTag` on the named node, remembering which node the handle belongs to."""
-        owner = self.node(node_name)
-        owner.AddTag(handle, address)
-        known = self._owners.get(handle, owner)
-        self._owners[handle] = owner if known is owner else None
+        """`AddTag` on the named node."""
+        self.node(node_name).AddTag(handle, address)
 
     async def changes(self) -> AsyncIterator[Change]:
-        """Every tag of every value report from now on, as `Change(node, handle, value)`;
-        attaches the library to the running asyncio loop if it is not yet."""
+        """Every tag of every value report a driver makes from now on, as
+        `Change(node, handle, value)`; attaches the library to the running asyncio loop if
+        it is not yet."""
         if self.host is None:
             raise RuntimeError("changes() needs the project entered (with Project(...) as p)")
         await attach()
-        queue: asyncio.Queue[Change] = asyncio.Queue()
+        queue: asyncio.Queue = asyncio.Queue()
 
-        def report(handles: list, count: int, values: list) -> None:
+        def report(name: str, handles: list, count: int, values: list) -> None:
             for handle, value in zip(handles, values):
-                queue.put_nowait(Change(self._owners.get(handle), handle, value))
+                queue.put_nowait((name, handle, value))
 
-        connection = self.host.ValueChange.connect(report)
+        connection = reports.Values.connect(report)
         try:
             while True:
-                yield await queue.get()
+                name, handle, value = await queue.get()
+                yield Change(self.db.getNode(name), handle, value)
         finally:
             connection.disconnect()

@@ -35,6 +35,14 @@ def test_driver_errors_and_the_nodedb_events(host):
         seen == [("OPC", "Group_DataChange", "bad item \xe9"), "nodeDB"]
 
 
+def test_the_report_tap_names_the_node(host):
+    seen = []
+    with maroset.reports.Values.connect(lambda *report: seen.append(report)):
+        mem_node(host).WriteTag(1, 2.5)
+        host.nodeDB.NewValue([1], 1, [0])  # not a driver's: not tapped
+    assert seen == [("Mem", [1], 1, [2.5])]
+
+
 def test_a_raising_callback_is_reported_and_the_others_carry_on(host, unraisable):
     seen = []
 
