@@ -7,14 +7,15 @@ import os
 from typing import AsyncIterator, NamedTuple, Optional, Union
 
 from ._asyncio import attach
-from ._maroset import ClsNodeDBInterface, node, reports
+from . import _maroset
+from ._maroset import ClsNodeDBInterface, reports
 
 
 class Change(NamedTuple):
     """One tag's new value: the node whose driver reported it (None when the node is gone
     by the time the change is taken), the tag's handle and the value."""
 
-    node: Optional[node]
+    node: Optional[_maroset.node]
     handle: int
     value: object
 
@@ -46,7 +47,7 @@ class Project:
         finally:
             self.db.RemoveAllNodes()
 
-    def node(self, name: str) -> node:
+    def node(self, name: str) -> _maroset.node:
         """The node of that name; KeyError when the project has none."""
         found = self.db.getNode(name)
         if found is None:
