@@ -37,13 +37,6 @@ std::string Text(py::handle value) {
     return CStr(FromPython(value));
 }
 
-// Paths also come as os.PathLike objects.
-std::string PathText(py::handle value) {
-    if (PyObject_HasAttrString(value.ptr(), "__fspath__"))
-        return TextFromPython(py::module_::import("os").attr("fsdecode")(value));
-    return Text(value);
-}
-
 VbArray<int32_t> HandlesFromPython(py::handle sequence) {
     const VbArray<Variant> values = ArrayFromPython(sequence, 1);
     VbArray<int32_t> handles(1, values.size());
@@ -166,7 +159,9 @@ void BindNodeDB(py::module_& m) {
             py::arg("ScanRate") = 0, py::arg("TagPrefex") = 0)
         .def(
             "AddAllNodes",
-            [](nodeDB& db, py::handle ProjectDBName) { db.AddAllNodes(PathText(ProjectDBName)); },
+            [](nodeDB& db, py::handle ProjectDBName) {
+                db.AddAllNodes(PathFromPython(ProjectDBName));
+            },
             py::arg("ProjectDBName"))
         .def(
             "RemoveNode", [](nodeDB& db, py::handle NodeName) { db.RemoveNode(Text(NodeName)); },

@@ -37,8 +37,7 @@ std::string RuntimeSettings::driveRoot() const {
 }
 
 void RuntimeSettings::setDriveRoot(py::handle path) {
-    const py::object native = py::module_::import("os").attr("fsdecode")(path);
-    Runtime::current().files().setDriveRoot(TextFromPython(native));
+    Runtime::current().files().setDriveRoot(PathFromPython(path));
 }
 
 std::string RuntimeSettings::serialDevice(py::handle key) const {

@@ -55,6 +55,10 @@ std::string TextFromPython(py::handle text) {
                        static_cast<size_t>(PyBytes_GET_SIZE(encoded.ptr())));
 }
 
+std::string PathFromPython(py::handle path) {
+    return TextFromPython(py::module_::import("os").attr("fsdecode")(path));
+}
+
 py::list ToList(const VbArray<int32_t>& items) {
     py::list list(static_cast<size_t>(items.size()));
     size_t i = 0;

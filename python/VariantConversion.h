@@ -27,6 +27,8 @@ Variant FromPython(pybind11::handle value);
 
 pybind11::str TextToPython(const std::string& bytes);
 std::string TextFromPython(pybind11::handle text);
+// A path as str, bytes or os.PathLike, as the file system's bytes.
+std::string PathFromPython(pybind11::handle path);
 
 // A one-based report array as a list.
 pybind11::list ToList(const VbArray<int32_t>& items);
