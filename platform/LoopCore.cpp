@@ -60,6 +60,7 @@ void LoopCore::unwatch(WatchId id) {
     if (it == watches_.end()) return;
     it->second->live = false;  // a dispatch in progress holds its own reference
     watches_.erase(it);
+    ++removedWatches_;
 }
 
 void LoopCore::stop() {
@@ -69,6 +70,19 @@ void LoopCore::stop() {
 std::optional<LoopCore::Duration> LoopCore::nextDue() const {
     if (timers_.empty()) return std::nullopt;
     return timers_.begin()->first.first;
+}
+
+std::vector<std::pair<int, short>> LoopCore::pollSet() const {
+    std::vector<std::pair<int, short>> set;
+    for (const auto& [id, w] : watches_) {
+        if (!w->running && !w->invalid) set.emplace_back(w->fd, w->events);
+    }
+    return set;
+}
+
+void LoopCore::setSleepHooks(std::function<void()> enter, std::function<void()> leave) {
+    sleepEnter_ = std::move(enter);
+    sleepLeave_ = std::move(leave);
 }
 
 void LoopCore::runPosted(const bool* stop) {
@@ -111,7 +125,16 @@ int LoopCore::pollWatches(int timeoutMs, const bool* stop) {
     }
     // Nothing to watch and no time to wait: the system call would only cost time.
     if (fds.empty() && timeoutMs == 0) return 0;
-    const int n = ::poll(fds.empty() ? nullptr : fds.data(), fds.size(), timeoutMs);
+    int n = 0;
+    if (timeoutMs != 0 && sleepEnter_) {
+        sleepEnter_();
+        n = ::poll(fds.empty() ? nullptr : fds.data(), fds.size(), timeoutMs);
+        const int saved = errno;
+        if (sleepLeave_) sleepLeave_();
+        errno = saved;
+    } else {
+        n = ::poll(fds.empty() ? nullptr : fds.data(), fds.size(), timeoutMs);
+    }
     if (n < 0) {
         if (errno == EINTR || errno == EAGAIN) return 0;
         throw std::system_error(errno, std::generic_category(), "poll");

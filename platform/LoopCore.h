@@ -51,6 +51,17 @@ class LoopCore {
     std::optional<Duration> nextDue() const;
     size_t timerCount() const { return timers_.size(); }
 
+    // The descriptors a poll would wait on now, with their events; fd order, one entry per
+    // watch. watchGeneration() changes whenever a watch is added or removed, so a mirror of
+    // this set (an epoll instance) knows when to rebuild itself.
+    std::vector<std::pair<int, short>> pollSet() const;
+    uint64_t watchGeneration() const { return nextWatch_ + removedWatches_; }
+
+    // Called just before and just after a poll that may block (a timeout other than zero),
+    // never around callbacks: a host with an interpreter lock releases it only while the
+    // loop sleeps. `leave` runs however the poll ends.
+    void setSleepHooks(std::function<void()> enter, std::function<void()> leave);
+
     // Each step below returns early once *stop becomes true (stop may be null: a pump).
     // Runs the calls posted before this step, in order.
     void runPosted(const bool* stop);
@@ -82,6 +93,9 @@ class LoopCore {
     uint64_t nextPost_ = 1;
     std::map<WatchId, std::shared_ptr<Watch>> watches_;
     WatchId nextWatch_ = 1;
+    uint64_t removedWatches_ = 0;
+    std::function<void()> sleepEnter_;
+    std::function<void()> sleepLeave_;
     uint64_t pollPass_ = 0;
     std::vector<Frame*> frames_;
 };

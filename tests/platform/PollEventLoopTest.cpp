@@ -2,9 +2,11 @@
 
 #include <gtest/gtest.h>
 
+#include <poll.h>
 #include <unistd.h>
 
 #include <ctime>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -67,6 +69,52 @@ TEST_F(RealLoop, IdleLoopSleepsEvenWithAClosedDescriptorWatched) {
     EXPECT_EQ(ticks, 1);
     EXPECT_EQ(dead, (std::vector<short>{EventLoop::Error}));  // reported once, then left out
     EXPECT_LT(cpu, 0.2 * wall) << "cpu " << cpu << " s over " << wall << " s";
+}
+
+// Whether fd is readable now.
+bool readable(int fd) {
+    pollfd p{fd, POLLIN, 0};
+    return ::poll(&p, 1, 0) == 1 && (p.revents & POLLIN);
+}
+
+TEST_F(RealLoop, AnotherLoopWaitsOnTheReadinessDescriptorAndTheNextTimeout) {
+    const int ready = loop.readinessFd();
+    EXPECT_EQ(loop.prepareExternalWait(), std::nullopt) << "nothing to do: wait for the fd";
+    EXPECT_FALSE(readable(ready));
+
+    loop.post([&] { seen += "posted "; });  // from outside the loop: wakes the waiter
+    EXPECT_TRUE(readable(ready));
+    EXPECT_EQ(loop.prepareExternalWait(), milliseconds(0));
+    EXPECT_FALSE(readable(ready)) << "prepare drains the wake-up";
+    loop.pump();
+
+    loop.schedule(milliseconds(60'000), [] {});
+    const auto wait = loop.prepareExternalWait();
+    ASSERT_TRUE(wait.has_value());
+    EXPECT_GT(*wait, milliseconds(50'000));
+
+    loop.watch(fds[0], EventLoop::Readable, [&](short) {
+        char buf[8];
+        seen += std::string(buf, static_cast<size_t>(read(fds[0], buf, sizeof buf))) + " ";
+    });
+    loop.prepareExternalWait();
+    EXPECT_FALSE(readable(ready));
+    ASSERT_EQ(write(fds[1], "data", 4), 4);
+    EXPECT_TRUE(readable(ready)) << "a watched descriptor is ready";
+    loop.pump();
+    loop.prepareExternalWait();
+    EXPECT_FALSE(readable(ready));
+    EXPECT_EQ(seen, "posted data ");
+}
+
+TEST_F(RealLoop, SleepHooksRunAroundWaitsThatBlockOnly) {
+    std::string hooks;
+    loop.setSleepHooks([&] { hooks += "("; }, [&] { hooks += ")"; });
+    loop.post([&] { hooks += "p"; });
+    loop.pump();  // never waits
+    loop.schedule(milliseconds(5), [&] { hooks += "t"; });
+    loop.runFor(milliseconds(20));
+    EXPECT_EQ(hooks.substr(0, 4), "p()t") << hooks;
 }
 
 }  // namespace
