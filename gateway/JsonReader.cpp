@@ -26,7 +26,7 @@ void JsonReader::skipBlanks() {
 }
 
 JsonValue JsonReader::value(int depth) {
-    if (depth > MaxDepth) fail("JSON nested too deeply");
+    if ((peek() == '{' || peek() == '[') && depth >= MaxDepth) fail("JSON nested too deeply");
     switch (peek()) {
         case '{':
             return object(depth + 1);

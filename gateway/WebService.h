@@ -37,6 +37,7 @@ class WebService {
 
     // "http://HOST:PORT/"
     std::string url() const;
+    uint16_t port() const { return server_.port(); }
     bool writesAllowed() const { return writes_.allowed; }
 
     // Whether host is an IPv4 loopback address (127.0.0.0/8).
