@@ -279,53 +279,53 @@ void HostSession::finish() {
 
 void HostSession::add(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
-    reply.node = name;
     const int32_t handle = integer(args, "HANDLE");
     const std::string address = args.rest();
     if (address.empty()) throw BadCommand("missing ADDRESS");
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->AddTag(handle, address);
 }
 
 void HostSession::remove(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
-    reply.node = name;
     const int32_t handle = integer(args, "HANDLE");
     noMore(args);
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->RemoveTag(handle);
 }
 
 void HostSession::read(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
-    reply.node = name;
     const int32_t handle = integer(args, "HANDLE");
     noMore(args);
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->ReadTag(handle);
 }
 
 void HostSession::write(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
-    reply.node = name;
     // The handle travels as the text given; the node converts it.
     const std::string handle = word(args, "HANDLE");
     auto value = args.next();
     if (!value) throw BadCommand("missing VALUE");
     noMore(args);
     const Variant v = CommandTokenizer::ParseValue(*value);
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->WriteTag(handle, v);
 }
 
 void HostSession::writearray(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
-    reply.node = name;
     const std::string handle = word(args, "HANDLE");
     std::vector<Variant> items;
     while (auto value = args.next()) items.push_back(CommandTokenizer::ParseValue(*value));
     if (items.empty()) throw BadCommand("missing VALUE");
     VbArray<Variant> values(0, std::move(items));
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->WriteArray(handle, values);
 }
@@ -342,7 +342,6 @@ void HostSession::stop(CommandTokenizer& args, Reply&) {
 
 void HostSession::addnode(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NAME");
-    reply.node = name;
     const std::string driver = word(args, "DRIVER");
     std::string topic;
     int32_t scanRate = 0;
@@ -353,13 +352,14 @@ void HostSession::addnode(CommandTokenizer& args, Reply& reply) {
         if (!args.atEnd()) prefix = integer(args, "PREFIX");
     }
     noMore(args);
+    reply.node = name;
     db().AddNode(name, driver, topic, scanRate, prefix);
 }
 
 void HostSession::removenode(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NAME");
-    reply.node = name;
     noMore(args);
+    reply.node = name;
     db().RemoveNode(name);
 }
 

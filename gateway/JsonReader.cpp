@@ -77,7 +77,8 @@ JsonValue JsonReader::object(int depth) {
         if (peek() != ':') fail("expected ':'");
         ++pos_;
         skipBlanks();
-        v.members.emplace_back(std::move(name), value(depth));
+        v.values.push_back(value(depth));
+        v.names.push_back(std::move(name));
         skipBlanks();
         if (peek() == ',') {
             ++pos_;

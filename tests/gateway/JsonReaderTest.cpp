@@ -16,8 +16,10 @@ TEST(JsonReader, ReadsEveryKindOfValue) {
         " {\"a\": [1, -2.5e1, 3000000000, true, false, null], \"b\": {\"c\": \"x\\\"\\u00e9\\n\"},"
         " \"a\": 0}\r\n");
     ASSERT_EQ(v.kind, JsonValue::Kind::Object);
-    ASSERT_EQ(v.members.size(), 3u);
-    const JsonValue& a = v.members[0].second;
+    ASSERT_EQ(v.names.size(), 3u);
+    ASSERT_EQ(v.values.size(), 3u);
+    EXPECT_EQ(v.names[1], "b");
+    const JsonValue& a = v.values[0];
     ASSERT_EQ(a.items.size(), 6u);
     EXPECT_TRUE(a.items[0].integral);
     EXPECT_EQ(a.items[0].number, 1);
