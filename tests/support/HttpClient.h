@@ -41,9 +41,6 @@ class HttpClient {
         const std::string& received() const { return received_; }
         // Whether the server closed the connection.
         bool closed() const { return closed_; }
-        // Stops reading for a while without closing (a client that does not keep up).
-        void readNothing() { reading_ = false; }
-        int fd() const { return fd_; }
 
       private:
         void drain();
@@ -52,7 +49,6 @@ class HttpClient {
         int fd_;
         std::string received_;
         bool closed_ = false;
-        bool reading_ = true;
     };
 
     // Runs the loop until done() holds or the time is up; done()'s last answer.
