@@ -157,14 +157,14 @@ HostSession::HostSession(HostOptions options, std::ostream& out, int inputFd)
     if (options_.trace) {
         // Standard error, flushed per line: events and replies on standard output stay as
         // they are, and a user watching a line sees each incident as it happens.
-        rt.trace().setSink(
-            [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
+        trace_.emplace(rt.incidents(),
+                       [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
     }
 }
 
 HostSession::~HostSession() {
     if (inputWatch_) loop().unwatch(*inputWatch_);
-    Runtime::current().trace().setSink({});
+    trace_.reset();
     valueChange_.reset();
     driverError_.reset();
     host_.reset();
