@@ -56,8 +56,7 @@ std::filesystem::path HostOptions::projectFile() const {
     // The library takes a path with a drive letter or a backslash as a path on drive C:.
     const bool drivePath =
         (project.size() >= 2 && project[1] == ':') || project.find('\\') != std::string::npos;
-    return drivePath ? Runtime::current().files().resolve(project)
-                     : std::filesystem::path(project);
+    return drivePath ? Runtime::current().files().resolve(project) : std::filesystem::path(project);
 }
 
 bool HostOptions::projectExists() const {

@@ -41,15 +41,15 @@ EventStream::EventStream(platform::EventLoop& loop, ReportTap& reports, LinkStat
     valuesTap_ = reports.Values.subscribe(
         [this](std::string_view node, const VbArray<int32_t>& handles, int16_t count,
                const VbArray<Variant>& v) { values(node, handles, count, v); });
-    errorsTap_ = reports.Errors.subscribe([this](std::string_view, const std::string& driver,
-                                                 const std::string& from,
-                                                 const std::string& message) {
-        if (clients() == 0) return;
-        JsonWriter j;
-        j.beginObject().key("driver").string(driver).key("from").string(from);
-        j.key("message").string(message).endObject();
-        send("event: error\ndata: " + j.str() + "\n\n");
-    });
+    errorsTap_ =
+        reports.Errors.subscribe([this](std::string_view, const std::string& driver,
+                                        const std::string& from, const std::string& message) {
+            if (clients() == 0) return;
+            JsonWriter j;
+            j.beginObject().key("driver").string(driver).key("from").string(from);
+            j.key("message").string(message).endObject();
+            send("event: error\ndata: " + j.str() + "\n\n");
+        });
     linkChanges_ = links.StateChanged.subscribe([this](const LinkStatus& status) {
         if (clients() == 0) return;
         JsonWriter j;

@@ -1,7 +1,7 @@
 #include "cli/ServeCommand.h"
 
-#include <gtest/gtest.h>
 #include <fcntl.h>
+#include <gtest/gtest.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/wait.h>
@@ -47,8 +47,10 @@ class ServeProcess {
         posix_spawn_file_actions_t actions;
         posix_spawn_file_actions_init(&actions);
         posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-        posix_spawn_file_actions_addopen(&actions, 1, out().c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-        posix_spawn_file_actions_addopen(&actions, 2, err().c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+        posix_spawn_file_actions_addopen(&actions, 1, out().c_str(), O_WRONLY | O_CREAT | O_TRUNC,
+                                         0644);
+        posix_spawn_file_actions_addopen(&actions, 2, err().c_str(), O_WRONLY | O_CREAT | O_TRUNC,
+                                         0644);
         if (posix_spawn(&pid_, argv[0], &actions, nullptr, argv.data(), environ) != 0) pid_ = -1;
         posix_spawn_file_actions_destroy(&actions);
     }
@@ -126,8 +128,11 @@ TEST_F(ServeCommandTest, ServesTheProjectsTagsUntilASignalStopsItCleanly) {
         HttpClient http(loop, static_cast<uint16_t>(std::stoi(m[1])));
         EXPECT_EQ(http.request("POST", "/api/tags/Mem/1", R"({"value":4})").body, R"({"ok":true})");
         const auto tags = http.request("GET", "/api/tags");
-        EXPECT_EQ(tags.body.rfind(R"([{"node":"Mem","handle":1,"address":"Setpoint","name":"Set point","value":4,"type":"Long","time":")", 0),
-                  0u)
+        EXPECT_EQ(
+            tags.body.rfind(
+                R"([{"node":"Mem","handle":1,"address":"Setpoint","name":"Set point","value":4,"type":"Long","time":")",
+                0),
+            0u)
             << tags.body;
         EXPECT_EQ(serve.stop(signal), 0);
         EXPECT_EQ(readFile(serve.err()),

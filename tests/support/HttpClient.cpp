@@ -52,8 +52,10 @@ int HttpClient::connectAndSend(const std::string& text) {
     size_t sent = 0;
     runUntil([&] {
         const ssize_t n = ::send(fd, text.data() + sent, text.size() - sent, MSG_NOSIGNAL);
-        if (n > 0) sent += static_cast<size_t>(n);
-        else if (n < 0 && errno != EAGAIN) return true;  // the server closed: read its answer
+        if (n > 0)
+            sent += static_cast<size_t>(n);
+        else if (n < 0 && errno != EAGAIN)
+            return true;  // the server closed: read its answer
         return sent == text.size();
     });
     return fd;
@@ -62,7 +64,8 @@ int HttpClient::connectAndSend(const std::string& text) {
 HttpClient::Response HttpClient::request(const std::string& method, const std::string& path,
                                          const std::string& body,
                                          const std::vector<std::string>& headers) {
-    std::string text = method + " " + path + " HTTP/1.1\r\nHost: 127.0.0.1\r\nConnection: close\r\n";
+    std::string text =
+        method + " " + path + " HTTP/1.1\r\nHost: 127.0.0.1\r\nConnection: close\r\n";
     for (const auto& h : headers) text += h + "\r\n";
     if (!body.empty() || method == "POST")
         text += "Content-Length: " + std::to_string(body.size()) + "\r\n";

@@ -24,8 +24,7 @@ class HttpClient {
 
     // One request on its own connection ("Connection: close"); the answer read to its end.
     Response request(const std::string& method, const std::string& path,
-                     const std::string& body = "",
-                     const std::vector<std::string>& headers = {});
+                     const std::string& body = "", const std::vector<std::string>& headers = {});
 
     // An open GET whose answer keeps coming (an event stream).
     class Stream {
