@@ -1,11 +1,12 @@
-#include "cli/JsonWriter.h"
+#include "gateway/JsonWriter.h"
 
 #include <cmath>
+#include <cstdio>
 
 #include "lang/Conversions.h"
 #include "lang/Object.h"
 
-namespace maroset::cli {
+namespace maroset::gateway {
 
 void JsonWriter::separate() {
     if (afterKey_) {
@@ -46,7 +47,7 @@ JsonWriter& JsonWriter::endArray() {
 
 JsonWriter& JsonWriter::key(std::string_view name) {
     separate();
-    out_ += Quote(name);
+    AppendQuoted(out_, name);
     out_ += ':';
     afterKey_ = true;
     return *this;
@@ -54,7 +55,7 @@ JsonWriter& JsonWriter::key(std::string_view name) {
 
 JsonWriter& JsonWriter::string(std::string_view bytes) {
     separate();
-    out_ += Quote(bytes);
+    AppendQuoted(out_, bytes);
     return *this;
 }
 
@@ -104,9 +105,14 @@ JsonWriter& JsonWriter::value(const Variant& v) {
 }
 
 std::string JsonWriter::Quote(std::string_view bytes) {
-    static constexpr char hex[] = "0123456789abcdef";
     std::string out;
     out.reserve(bytes.size() + 2);
+    AppendQuoted(out, bytes);
+    return out;
+}
+
+void JsonWriter::AppendQuoted(std::string& out, std::string_view bytes) {
+    static constexpr char hex[] = "0123456789abcdef";
     out += '"';
     for (const char c : bytes) {
         const auto b = static_cast<unsigned char>(c);
@@ -144,7 +150,6 @@ std::string JsonWriter::Quote(std::string_view bytes) {
         }
     }
     out += '"';
-    return out;
 }
 
 std::string JsonWriter::Number(const Variant& number) {
@@ -156,4 +161,23 @@ std::string JsonWriter::Number(const Variant& number) {
     return text;
 }
 
-}  // namespace maroset::cli
+JsonWriter& JsonWriter::raw(std::string_view json) {
+    separate();
+    out_ += json;
+    return *this;
+}
+
+JsonWriter& JsonWriter::time(platform::DateTime t) {
+    using namespace std::chrono;
+    const auto day = floor<days>(t);
+    const year_month_day ymd{day};
+    const hh_mm_ss<milliseconds> clock{t - day};
+    char text[64];
+    std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02ld:%02ld:%02ld.%03ld", int(ymd.year()),
+                  unsigned(ymd.month()), unsigned(ymd.day()), long(clock.hours().count()),
+                  long(clock.minutes().count()), long(clock.seconds().count()),
+                  long(clock.subseconds().count()));
+    return string(text);
+}
+
+}  // namespace maroset::gateway
