@@ -2,11 +2,13 @@
 
 #include <algorithm>
 
-#include "cli/JsonWriter.h"
+#include "gateway/JsonWriter.h"
 #include "lang/Conversions.h"
 #include "lang/Object.h"
 
 namespace maroset::cli {
+
+using gateway::JsonWriter;
 
 namespace {
 

@@ -5,12 +5,14 @@
 
 #include "cli/CommandLine.h"
 #include "cli/EventPrinter.h"
-#include "cli/JsonWriter.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/UsageError.h"
+#include "gateway/JsonWriter.h"
 #include "lang/VbError.h"
 
 namespace maroset::cli {
+
+using gateway::JsonWriter;
 
 const char* const ProjectCommands::Usage =
     "usage: maroset project init PATH\n"

@@ -1,11 +1,11 @@
-#include "cli/JsonWriter.h"
+#include "gateway/JsonWriter.h"
 
 #include <cmath>
 
 #include "lang/Conversions.h"
 #include "lang/Object.h"
 
-namespace maroset::cli {
+namespace maroset::gateway {
 
 void JsonWriter::separate() {
     if (afterKey_) {
@@ -156,4 +156,4 @@ std::string JsonWriter::Number(const Variant& number) {
     return text;
 }
 
-}  // namespace maroset::cli
+}  // namespace maroset::gateway

@@ -7,7 +7,7 @@
 
 #include "lang/Variant.h"
 
-namespace maroset::cli {
+namespace maroset::gateway {
 
 // Builds one compact JSON text (no blanks), keys in the order they are written.
 //
@@ -50,4 +50,4 @@ class JsonWriter {
     bool afterKey_ = false;
 };
 
-}  // namespace maroset::cli
+}  // namespace maroset::gateway

@@ -1,0 +1,51 @@
+#pragma once
+
+#include <cstdint>
+#include <deque>
+#include <map>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "lang/Variant.h"
+#include "platform/Clock.h"
+
+namespace maroset::gateway {
+
+// One tag the service publishes: where it lives (node and the host's handle), its address
+// and the name people and brokers know it by, and the latest value a driver reported.
+struct TagEntry {
+    std::string node;  // the node's Name as the project spells it
+    int32_t handle = 0;
+    std::string address;
+    std::string name;
+    uint64_t position = 0;  // 1-based, in the order added; never reused
+    Variant value;  // Empty until the first report
+    platform::DateTime time{};
+};
+
+// The tags of a running project, found by node and handle (what drivers report) or by node
+// and name (what a broker's write names). Node names match in any letter case, as the node
+// collection's keys do; tag names match exactly. Entries never move once added, so a
+// pointer to one stays valid for the directory's life.
+class TagDirectory {
+  public:
+    // Adds a tag; a second tag with the same node and handle replaces nothing and is ignored.
+    void add(std::string node, int32_t handle, std::string address, std::string name);
+
+    TagEntry* find(std::string_view node, int32_t handle);
+    TagEntry* byName(std::string_view node, std::string_view name);
+    // The node's tags in the order they were added.
+    std::vector<TagEntry*> ofNode(std::string_view node);
+    // Every tag in the order added.
+    std::deque<TagEntry>& all() { return entries_; }
+
+  private:
+    std::deque<TagEntry> entries_;
+    // Keyed by upper-cased node name.
+    std::map<std::pair<std::string, int32_t>, TagEntry*, std::less<>> byHandle_;
+    std::map<std::pair<std::string, std::string>, TagEntry*, std::less<>> byName_;
+};
+
+}  // namespace maroset::gateway
