@@ -5,9 +5,9 @@
 
 #include "cli/CommandLine.h"
 #include "cli/EventPrinter.h"
+#include "gateway/JsonWriter.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/UsageError.h"
-#include "gateway/JsonWriter.h"
 #include "lang/VbError.h"
 
 namespace maroset::cli {

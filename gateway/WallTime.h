@@ -1,20 +1,17 @@
 #pragma once
 
 #include <cstdint>
-#include <string>
 
 #include "platform/Clock.h"
 
 namespace maroset::gateway {
 
-// The system's clock tells local civil time; brokers and their hosts want instants. Converts
-// with the machine's time zone, the offset looked up once per local hour.
+// The system's clock tells local civil time; Sparkplug hosts want instants. Converts with the
+// machine's time zone, the offset looked up once per local hour.
 class WallTime {
   public:
     // Milliseconds since 1970-01-01 UTC.
     int64_t epochMillis(platform::DateTime local);
-    // "2026-03-07T09:00:00.000+01:00".
-    std::string iso8601(platform::DateTime local);
 
   private:
     // Seconds to add to local time for UTC, for the local hour `hour_`.

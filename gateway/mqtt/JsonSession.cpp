@@ -55,7 +55,7 @@ void JsonSession::change(TagChange change) {
 
 bool JsonSession::publishValue(const TagChange& change) {
     JsonWriter j;
-    j.beginObject().key("value").value(change.value).key("time").string(c_.wall.iso8601(change.time)).endObject();
+    j.beginObject().key("value").value(change.value).key("time").time(change.time).endObject();
     const TagEntry& tag = *change.tag;
     return c_.client.publish(c_.options.prefix + "/" + tag.node + "/" + tag.name, j.str(), kQos,
                              true);
@@ -100,7 +100,7 @@ void JsonSession::refuse(const std::string& topic, const std::string& error) {
     j.beginObject()
         .key("topic").string(std::string_view(topic).substr(0, kTopicQuoted))
         .key("error").string(error)
-        .key("time").string(c_.wall.iso8601(c_.clock.now()))
+        .key("time").time(c_.clock.now())
         .endObject();
     c_.client.publish(errorsTopic_, j.str(), kQos, false);
 }

@@ -29,9 +29,8 @@ class MqttCommand {
     static constexpr size_t kMaxMetrics = 1000;
 
     // A `set` payload: {"value": V} or a bare JSON value V, where V is a number, a string,
-    // true, false or null. Numbers that are whole and fit 32 bits become a Long, others a
-    // Double; strings are taken as Latin-1 (\u escapes above \u00FF are refused). Empty
-    // result and `error` set when the payload is refused.
+    // true, false or null, read as the HTTP API reads a written value. Empty result and
+    // `error` set when the payload is refused.
     static std::optional<Variant> ParseSet(std::string_view payload, std::string& error);
 
     // An NCMD or DCMD payload: every metric with a name or an alias. Empty result and
