@@ -2,7 +2,7 @@
 
 #include "gateway/JsonReader.h"
 #include "gateway/mqtt/SparkplugMetric.h"
-#include "sparkplug_b.pb.h"
+#include "mqtt/sparkplug_b.pb.h"
 
 namespace maroset::gateway {
 

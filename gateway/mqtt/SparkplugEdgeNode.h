@@ -7,7 +7,7 @@
 #include <vector>
 
 #include "gateway/mqtt/MqttSession.h"
-#include "sparkplug_b.pb.h"
+#include "mqtt/sparkplug_b.pb.h"
 
 namespace maroset::gateway {
 

@@ -3,7 +3,7 @@
 #include <cstdint>
 
 #include "lang/Variant.h"
-#include "sparkplug_b.pb.h"
+#include "mqtt/sparkplug_b.pb.h"
 
 namespace maroset::gateway {
 

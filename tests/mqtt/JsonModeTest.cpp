@@ -65,7 +65,7 @@ TEST_F(JsonMode, ValuesStateAndLinkAreRetainedForLateSubscribers) {
     EXPECT_EQ(late.on("maroset/$state")[1].payload, "offline");
 }
 
-TEST_F(JsonMode, LinkTopicFollowsADeviceThatStopsAndReturns) {
+TEST_F(JsonMode, TheLinkTopicFollowsTheNodesLinkState) {
     auto sim = sim::SoftPlcSimulator::OnLoopback(0, {100, 0});
     nodeDB& db = *runtime().nodes();
     db.AddAllNodes(test::SoftPlcProject(dir_.path() / "project.db",
@@ -77,18 +77,22 @@ TEST_F(JsonMode, LinkTopicFollowsADeviceThatStopsAndReturns) {
     auto plc = db.getNode("PLC1");
     plc->AddTag(41, "Level");
     db.StartScanning();
-    const auto lastLink = [&] {
+    const auto lastState = [&] {
         const auto links = watcher.on("maroset/PLC1/$link");
-        return links.empty() ? std::string() : links.back().payload;
+        if (links.empty()) return std::string();
+        const std::string& p = links.back().payload;
+        const size_t at = p.find("\"state\":\"") + 9;
+        return p.substr(at, p.find('"', at) - at);
     };
-    ASSERT_TRUE(runUntil([&] { return lastLink().find("\"state\":\"up\"") != std::string::npos; }));
+    ASSERT_TRUE(runUntil([&] { return lastState() == "connecting"; }));
     ASSERT_TRUE(runUntil([&] { return !watcher.on("maroset/PLC1/TankLevel").empty(); }));
-
+    tell("PLC1", platform::IncidentKind::Opened);
+    ASSERT_TRUE(runUntil([&] { return lastState() == "up"; }));
     sim->stopListening();
-    sim->startListening();
-    ASSERT_TRUE(runUntil([&] { return lastLink().find("\"state\":\"down\"") != std::string::npos; }));
-    db.StartScanning();
-    ASSERT_TRUE(runUntil([&] { return lastLink().find("\"state\":\"up\"") != std::string::npos; }));
+    tell("PLC1", platform::IncidentKind::Closed);
+    ASSERT_TRUE(runUntil([&] { return lastState() == "down"; }));
+    tell("PLC1", platform::IncidentKind::Opened);
+    ASSERT_TRUE(runUntil([&] { return lastState() == "up"; }));
 }
 
 TEST_F(JsonMode, SetWritesReachTheDeviceOnlyWhenAllowed) {
@@ -156,9 +160,9 @@ TEST_F(JsonMode, APasswordBrokerTakesTheRightPasswordOnly) {
 // order holds once it is back.
 TEST_F(JsonMode, ChangesWhileTheBrokerIsAwayArriveInOrderAfterward) {
     auto t = tank();
-    t->WriteTag("2", Variant("manual"));
     startPublisher(options());
     ASSERT_TRUE(runUntil([&] { return publisher_->status().connected; }));
+    t->WriteTag("2", Variant("manual"));
 
     broker_.kill();
     ASSERT_TRUE(runUntil([&] { return !publisher_->status().connected; }));

@@ -2,6 +2,7 @@
 
 #include <arpa/inet.h>
 #include <netinet/in.h>
+#include <pwd.h>
 #include <signal.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -46,6 +47,8 @@ MosquittoBroker::MosquittoBroker(const std::filesystem::path& dir, std::string u
     : dir_(dir), port_(FreeLoopbackPort()) {
     std::ofstream conf(dir_ / "mosquitto.conf");
     conf << "listener " << port_ << " 127.0.0.1\n";
+    // Started as root, mosquitto would become user "mosquitto" and lose the temporary files.
+    if (const passwd* me = getpwuid(getuid())) conf << "user " << me->pw_name << "\n";
     if (user.empty()) {
         conf << "allow_anonymous true\n";
     } else {

@@ -10,7 +10,7 @@
 #include "core/nodeDB.h"
 #include "sim/softplc/SoftPlcSimulator.h"
 #include "softplc/SoftPlcProject.h"
-#include "sparkplug_b.pb.h"
+#include "mqtt/sparkplug_b.pb.h"
 
 namespace maroset {
 namespace {
@@ -157,23 +157,28 @@ TEST_F(Sparkplug, ADeviceDiesWithItsLinkAndIsBornAgainWhenItReturns) {
     auto p = plc(*sim);
     auto& host = probe("spBv1.0/#");
     startPublisher(edge());
+    ASSERT_TRUE(runUntil([&] { return host.on("spBv1.0/Plant/DBIRTH/Line1/Tank").size() == 1; }));
+    settle();
+    EXPECT_TRUE(host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1").empty()) << "not born before its link is up";
+    EXPECT_TRUE(host.on("spBv1.0/Plant/DDATA/Line1/PLC1").empty());
+
+    tell("PLC1", platform::IncidentKind::Opened);
     ASSERT_TRUE(runUntil([&] { return !host.on("spBv1.0/Plant/DDATA/Line1/PLC1").empty(); }));
-    const size_t births = host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1").size();
-    ASSERT_GE(births, 1u);
+    const auto births = host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1");
+    ASSERT_GE(births.size(), 1u);
+    EXPECT_EQ(decode(births.back()).metrics(0).name(), "TankLevel");
 
     sim->stopListening();
-    sim->startListening();
+    tell("PLC1", platform::IncidentKind::Closed);
     ASSERT_TRUE(runUntil([&] { return host.on("spBv1.0/Plant/DDEATH/Line1/PLC1").size() == 1; }));
     const size_t died = host.messages.size();
     settle();
     for (size_t i = died; i < host.messages.size(); ++i)
         EXPECT_EQ(host.messages[i].topic.find("/PLC1"), std::string::npos) << "nothing after its death";
 
-    runtime().nodes()->StartScanning();
-    ASSERT_TRUE(runUntil([&] { return host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1").size() > births; }));
-    const Payload reborn = decode(host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1")[births]);
-    ASSERT_EQ(reborn.metrics_size(), 1);
-    EXPECT_EQ(reborn.metrics(0).name(), "TankLevel");
+    sim->startListening();
+    tell("PLC1", platform::IncidentKind::Opened);
+    ASSERT_TRUE(runUntil([&] { return host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1").size() > births.size(); }));
     // The memory node never had a link to lose.
     EXPECT_TRUE(host.on("spBv1.0/Plant/DDEATH/Line1/Tank").empty());
     expectSeqRuns(host);
@@ -199,6 +204,7 @@ TEST_F(Sparkplug, DcmdWritesByAliasOrNameOnlyWhenAllowed) {
     auto sim = sim::SoftPlcSimulator::OnLoopback(0, {0, 0});
     auto p = plc(*sim);
     auto& host = probe("spBv1.0/Plant/DBIRTH/#");
+    tell("PLC1", platform::IncidentKind::Opened);
     startPublisher(edge());
     ASSERT_TRUE(runUntil([&] { return host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1").size() == 1; }));
     const uint64_t alias = decode(host.on("spBv1.0/Plant/DBIRTH/Line1/PLC1")[0]).metrics(0).alias();
@@ -247,11 +253,13 @@ TEST_F(Sparkplug, ChangesWhileTheBrokerIsAwayFollowTheRebirthAsHistory) {
     EXPECT_EQ(k[1], "DBIRTH/Tank");
     EXPECT_EQ(metric(decode(host.messages[1]), "Level")->int_value(), 3000u);  // the latest
     int32_t expected = 1;
-    for (const auto& m : host.on("spBv1.0/Plant/DDATA/Line1/Tank"))
-        for (const auto& metric : decode(m).metrics()) {
+    for (const auto& m : host.on("spBv1.0/Plant/DDATA/Line1/Tank")) {
+        const Payload ddata = decode(m);
+        for (const auto& metric : ddata.metrics()) {
             EXPECT_TRUE(metric.is_historical());
             EXPECT_EQ(static_cast<int32_t>(metric.int_value()), expected++);
         }
+    }
     expectSeqRuns(host);
 }
 
