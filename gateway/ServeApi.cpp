@@ -8,6 +8,7 @@
 #include "gateway/LinkStatusJson.h"
 #include "gateway/PrometheusText.h"
 #include "gateway/WebAssets.h"
+#include "gateway/mqtt/MqttPublisher.h"
 #include "lang/VbError.h"
 
 namespace maroset::gateway {
@@ -48,8 +49,10 @@ HttpResponse ServeApi::handle(const HttpRequest& request) {
     }
     if (path == "/metrics") {
         return only(get, [&] {
-            return HttpResponse{200, "text/plain; version=0.0.4; charset=utf-8",
-                                PrometheusText::Render(links_.All()), nullptr};
+            std::string text = PrometheusText::Render(links_.All());
+            if (mqtt_) text += mqtt_->status().prometheus();
+            return HttpResponse{200, "text/plain; version=0.0.4; charset=utf-8", std::move(text),
+                                nullptr};
         });
     }
     if (const WebAssets::File* file = WebAssets::Find(path)) {
@@ -65,6 +68,7 @@ HttpResponse ServeApi::nodes() const {
     JsonWriter j;
     j.beginArray();
     for (const LinkStatus& s : links_.All()) LinkStatusJson::Write(j, s);
+    if (mqtt_) mqtt_->status().writeJson(j);
     return HttpResponse::Json(j.endArray().str());
 }
 

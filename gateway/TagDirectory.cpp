@@ -4,6 +4,10 @@
 
 namespace maroset::gateway {
 
+TagDirectory::TagDirectory(const std::vector<TagTable::Row>& rows) {
+    for (const TagTable::Row& row : rows) add(row.node, row.handle, row.address, row.name);
+}
+
 void TagDirectory::add(std::string node, int32_t handle, std::string address, std::string name) {
     std::string key = UCase(node);
     if (byHandle_.contains(std::pair(key, handle))) return;

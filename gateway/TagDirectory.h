@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "gateway/TagTable.h"
 #include "lang/Variant.h"
 #include "platform/Clock.h"
 
@@ -31,6 +32,12 @@ struct TagEntry {
 // pointer to one stays valid for the directory's life.
 class TagDirectory {
   public:
+    TagDirectory() = default;
+    // The service's tags as its Tags table names them.
+    explicit TagDirectory(const std::vector<TagTable::Row>& rows);
+    TagDirectory(const TagDirectory&) = delete;
+    TagDirectory& operator=(const TagDirectory&) = delete;
+
     // Adds a tag; a second tag with the same node and handle replaces nothing and is ignored.
     void add(std::string node, int32_t handle, std::string address, std::string name);
 

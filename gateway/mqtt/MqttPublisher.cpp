@@ -125,4 +125,32 @@ MqttStatus MqttPublisher::status() const {
     return s;
 }
 
+void MqttStatus::writeJson(JsonWriter& j) const {
+    const auto count = [](uint64_t n) { return static_cast<int64_t>(n); };
+    j.beginObject().key("name").string(MqttPublisher::kName).key("driver").string("MQTT");
+    j.key("endpoint").string(endpoint);
+    j.key("link").beginObject().key("state").string(state).key("connected").boolean(connected);
+    j.key("messagesOut").integer(count(messagesOut)).key("bytesOut").integer(count(bytesOut));
+    j.key("buffered").integer(count(buffered)).key("dropped").integer(count(dropped));
+    j.key("reconnects").integer(count(reconnects));
+    j.endObject().endObject();
+}
+
+std::string MqttStatus::prometheus() const {
+    std::string out;
+    const auto family = [&](const char* name, const char* type, const char* help, uint64_t v) {
+        out += std::string("# HELP ") + name + " " + help + "\n# TYPE " + name + " " + type + "\n" +
+               name + " " + std::to_string(v) + "\n";
+    };
+    family("maroset_mqtt_connected", "gauge", "1 while the broker connection is up.", connected);
+    family("maroset_mqtt_messages_out_total", "counter", "Messages published.", messagesOut);
+    family("maroset_mqtt_bytes_out_total", "counter", "Topic and payload bytes published.",
+           bytesOut);
+    family("maroset_mqtt_buffered", "gauge", "Changes kept for the broker's return.", buffered);
+    family("maroset_mqtt_dropped_total", "counter", "Changes dropped past the buffer.", dropped);
+    family("maroset_mqtt_reconnects_total", "counter", "Connections made again after a loss.",
+           reconnects);
+    return out;
+}
+
 }  // namespace maroset::gateway

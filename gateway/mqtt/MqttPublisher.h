@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "core/Runtime.h"
+#include "gateway/JsonWriter.h"
 #include "gateway/TagDirectory.h"
 #include "gateway/WallTime.h"
 #include "gateway/mqtt/MqttClient.h"
@@ -26,6 +27,14 @@ struct MqttStatus {
     uint64_t buffered = 0;
     uint64_t dropped = 0;
     uint64_t reconnects = 0;
+
+    // The `$mqtt` entry of the node list: {"name":"$mqtt","driver":"MQTT","endpoint",
+    // "link":{"state","connected","messagesOut","bytesOut","buffered","dropped","reconnects"}}.
+    void writeJson(JsonWriter& j) const;
+    // The metrics in Prometheus text: maroset_mqtt_connected, maroset_mqtt_messages_out_total,
+    // maroset_mqtt_bytes_out_total, maroset_mqtt_buffered, maroset_mqtt_dropped_total,
+    // maroset_mqtt_reconnects_total.
+    std::string prometheus() const;
 };
 
 // Publishes a running project to an MQTT broker, as plain JSON topics or as a Sparkplug B edge

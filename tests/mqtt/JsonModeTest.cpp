@@ -8,6 +8,9 @@
 #include "GatewayFixture.h"
 #include "core/node.h"
 #include "core/nodeDB.h"
+#include "gateway/EventStream.h"
+#include "gateway/ServeApi.h"
+#include "gateway/TagBook.h"
 #include "sim/softplc/SoftPlcSimulator.h"
 #include "softplc/SoftPlcProject.h"
 
@@ -213,6 +216,27 @@ TEST_F(JsonMode, PastTheBufferTheOldestChangesAreDroppedAndCounted) {
     };
     EXPECT_TRUE(told("the oldest are dropped"));
     EXPECT_TRUE(told("40 changes dropped"));
+}
+
+TEST_F(JsonMode, TheNodeListAndTheMetricsShowTheMqttSide) {
+    auto t = tank();
+    startPublisher(options());
+    ASSERT_TRUE(runUntil([&] { return publisher_->status().connected; }));
+    t->WriteTag("1", Variant(int32_t{1}));
+    gateway::TagBook book(runtime().reports(), runtime().clock(), {});
+    gateway::EventStream events(loop(), runtime().reports(), runtime().linkStatus(), runtime().clock());
+    gateway::ServeApi api(*runtime().nodes(), runtime().linkStatus(), book, events, {});
+    api.attach(*publisher_);
+    const std::string nodes = api.handle({"GET", "/api/nodes", "", ""}).body;
+    EXPECT_NE(nodes.find("{\"name\":\"$mqtt\",\"driver\":\"MQTT\",\"endpoint\":\"127.0.0.1:" +
+                         std::to_string(broker_.port()) + "\",\"link\":{\"state\":\"connected\","
+                         "\"connected\":true,\"messagesOut\":"),
+              std::string::npos)
+        << nodes;
+    const std::string metrics = api.handle({"GET", "/metrics", "", ""}).body;
+    EXPECT_NE(metrics.find("\nmaroset_mqtt_connected 1\n"), std::string::npos) << metrics;
+    EXPECT_NE(metrics.find("\nmaroset_mqtt_reconnects_total 0\n"), std::string::npos);
+    EXPECT_EQ(metrics.find("maroset_mqtt_messages_out_total 0\n"), std::string::npos);
 }
 
 }  // namespace
