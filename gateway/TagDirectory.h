@@ -5,7 +5,7 @@
 #include <map>
 #include <string>
 #include <string_view>
-#include <utility>
+#include <unordered_map>
 #include <vector>
 
 #include "gateway/TagTable.h"
@@ -32,27 +32,39 @@ struct TagEntry {
 // pointer to one stays valid for the directory's life.
 class TagDirectory {
   public:
+    // One node's tags.
+    struct NodeTags {
+        std::vector<TagEntry*> inOrder;
+        std::unordered_map<int32_t, TagEntry*> byHandle;
+        std::map<std::string, TagEntry*, std::less<>> byName;
+
+        TagEntry* find(int32_t handle) const {
+            const auto it = byHandle.find(handle);
+            return it == byHandle.end() ? nullptr : it->second;
+        }
+    };
+
     TagDirectory() = default;
     // The service's tags as its Tags table names them.
     explicit TagDirectory(const std::vector<TagTable::Row>& rows);
     TagDirectory(const TagDirectory&) = delete;
     TagDirectory& operator=(const TagDirectory&) = delete;
 
-    // Adds a tag; a second tag with the same node and handle replaces nothing and is ignored.
+    // Adds a tag; a second tag with the same node and handle is ignored.
     void add(std::string node, int32_t handle, std::string address, std::string name);
 
-    TagEntry* find(std::string_view node, int32_t handle);
-    TagEntry* byName(std::string_view node, std::string_view name);
-    // The node's tags in the order they were added.
-    std::vector<TagEntry*> ofNode(std::string_view node);
+    // The node's tags (a report's handles are looked up here, the node once per report);
+    // null when the node has none.
+    const NodeTags* node(std::string_view node) const;
+    TagEntry* find(std::string_view node, int32_t handle) const;
+    TagEntry* byName(std::string_view node, std::string_view name) const;
     // Every tag in the order added.
     std::deque<TagEntry>& all() { return entries_; }
 
   private:
     std::deque<TagEntry> entries_;
     // Keyed by upper-cased node name.
-    std::map<std::pair<std::string, int32_t>, TagEntry*, std::less<>> byHandle_;
-    std::map<std::pair<std::string, std::string>, TagEntry*, std::less<>> byName_;
+    std::map<std::string, NodeTags, std::less<>> nodes_;
 };
 
 }  // namespace maroset::gateway

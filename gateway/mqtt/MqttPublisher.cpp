@@ -70,10 +70,12 @@ void MqttPublisher::start() {
 
 void MqttPublisher::values(std::string_view node, const VbArray<int32_t>& handles, int16_t count,
                            const VbArray<Variant>& values) {
+    const TagDirectory::NodeTags* known = tags_.node(node);
+    if (!known) return;
     const platform::DateTime now = runtime_.clock().now();
     const bool publishing = session_->publishing();
     for (int32_t i = 1; i <= count && i <= handles.UBound() && i <= values.UBound(); ++i) {
-        TagEntry* tag = tags_.find(node, handles(i));
+        TagEntry* tag = known->find(handles(i));
         if (!tag) continue;
         tag->value = values(i);
         tag->time = now;

@@ -78,7 +78,8 @@ void SparkplugEdgeNode::stamp(sparkplug::Payload& payload) {
 }
 
 bool SparkplugEdgeNode::send(const std::string& topic, sparkplug::Payload& payload) {
-    return c_.client.publish(topic, payload.SerializeAsString(), kDataQos, false);
+    payload.SerializeToString(&wire_);
+    return c_.client.publish(topic, wire_, kDataQos, false);
 }
 
 void SparkplugEdgeNode::connecting() {
@@ -116,6 +117,7 @@ SparkplugEdgeNode::Device& SparkplugEdgeNode::device(std::string_view node) {
         it = devices_.emplace(key, Device{}).first;
         it->second.node = node;
         it->second.topicId = TopicLevel(node);
+        it->second.dataTopic = topic("DDATA", it->second);
     }
     return it->second;
 }
@@ -157,8 +159,9 @@ void SparkplugEdgeNode::deviceBirth(Device& d) {
     sparkplug::Payload payload;
     stamp(payload);
     const uint64_t now = payload.timestamp();
-    d.types.clear();
-    for (TagEntry* tag : c_.tags.ofNode(d.node)) {
+    types_.resize(c_.tags.all().size() + 1, sparkplug::Unknown);
+    const TagDirectory::NodeTags* tags = c_.tags.node(d.node);
+    for (TagEntry* tag : tags ? tags->inOrder : std::vector<TagEntry*>{}) {
         Metric& m = *payload.add_metrics();
         const sparkplug::DataType type = SparkplugMetric::TypeOf(tag->value);
         m.set_name(tag->name);
@@ -168,7 +171,7 @@ void SparkplugEdgeNode::deviceBirth(Device& d) {
                             ? now
                             : static_cast<uint64_t>(c_.wall.epochMillis(tag->time)));
         SparkplugMetric::Set(m, type, tag->value);
-        d.types[tag] = type;
+        types_[tag->position] = type;
     }
     d.born = send(topic("DBIRTH", d), payload);
 }
@@ -194,51 +197,47 @@ void SparkplugEdgeNode::change(TagChange change) {
 
 void SparkplugEdgeNode::flush() {
     if (pending_.empty()) return;
-    std::vector<TagChange> changes;
-    changes.swap(pending_);
+    flushing_.swap(pending_);
     if (state_ != State::Born) {
-        for (TagChange& ch : changes) c_.keep(std::move(ch));
+        for (TagChange& ch : flushing_) c_.keep(std::move(ch));
+        flushing_.clear();
         return;
     }
     // One message per device, in the order the devices first changed this turn.
-    struct Batch {
-        Device* device;
-        sparkplug::Payload payload;
-        std::vector<const TagChange*> changes;
-    };
-    std::vector<Batch> batches;
-    std::map<Device*, size_t> batchOf;
+    std::vector<Device*> order;
     std::set<Device*> reborn;
-    const auto sendBatch = [&](Batch& b) {
-        stamp(b.payload);
-        if (!send(topic("DDATA", *b.device), b.payload))
-            for (const TagChange* ch : b.changes) c_.keep(*ch);
-        b.payload.Clear();
-        b.changes.clear();
-    };
-    for (const TagChange& ch : changes) {
-        Device& d = device(ch.tag->node);
-        if (!d.born) continue;  // its birth carries the latest value
-        const auto type = d.types.find(ch.tag);
-        if (type == d.types.end() ||
-            (HasKind(ch.value) && SparkplugMetric::TypeOf(ch.value) != type->second)) {
-            reborn.insert(&d);
+    Device* d = nullptr;
+    for (const TagChange& ch : flushing_) {
+        if (!d || ch.tag->node != d->node) d = &device(ch.tag->node);
+        if (!d->born) continue;  // its birth carries the latest value
+        const sparkplug::DataType type = bornType(*ch.tag);
+        if (type == sparkplug::Unknown ||
+            (HasKind(ch.value) && SparkplugMetric::TypeOf(ch.value) != type)) {
+            reborn.insert(d);
             continue;
         }
-        auto [at, added] = batchOf.try_emplace(&d, batches.size());
-        if (added) batches.push_back(Batch{&d, {}, {}});
-        Batch& b = batches[at->second];
-        Metric& m = *b.payload.add_metrics();
+        if (d->batch.empty()) order.push_back(d);
+        Metric& m = *d->data.add_metrics();
         m.set_alias(ch.tag->position);
         m.set_timestamp(static_cast<uint64_t>(c_.wall.epochMillis(ch.time)));
-        SparkplugMetric::Set(m, type->second, ch.value);
-        b.changes.push_back(&ch);
-        if (b.payload.metrics_size() == kMetricsPerMessage) sendBatch(b);
+        SparkplugMetric::Set(m, type, ch.value);
+        d->batch.push_back(&ch);
+        if (d->data.metrics_size() == kMetricsPerMessage) sendData(*d);
     }
-    for (Batch& b : batches)
-        if (b.payload.metrics_size() > 0) sendBatch(b);
-    for (Device* d : reborn)
-        if (d->born) deviceBirth(*d);
+    for (Device* dev : order)
+        if (!dev->batch.empty()) sendData(*dev);
+    for (Device* dev : reborn)
+        if (dev->born) deviceBirth(*dev);
+    flushing_.clear();
+}
+
+void SparkplugEdgeNode::sendData(Device& d) {
+    stamp(d.data);
+    if (!send(d.dataTopic, d.data))
+        for (const TagChange* ch : d.batch) c_.keep(*ch);
+    // Cleared, not freed: the next turn's metrics reuse these.
+    d.data.Clear();
+    d.batch.clear();
 }
 
 void SparkplugEdgeNode::replay() {
@@ -249,7 +248,7 @@ void SparkplugEdgeNode::replay() {
     const auto sendRun = [&] {
         if (!current || payload.metrics_size() == 0) return true;
         stamp(payload);
-        const bool sent = send(topic("DDATA", *current), payload);
+        const bool sent = send(current->dataTopic, payload);
         payload.Clear();
         return sent;
     };
@@ -257,8 +256,8 @@ void SparkplugEdgeNode::replay() {
     while (!kept.empty()) {
         const TagChange& ch = kept.front();
         Device& d = device(ch.tag->node);
-        const auto type = d.types.find(ch.tag);
-        if (d.born && type != d.types.end()) {
+        const sparkplug::DataType type = bornType(*ch.tag);
+        if (d.born && type != sparkplug::Unknown) {
             if (&d != current || payload.metrics_size() == kMetricsPerMessage) {
                 if (!sendRun()) break;
                 current = &d;
@@ -267,7 +266,7 @@ void SparkplugEdgeNode::replay() {
             m.set_alias(ch.tag->position);
             m.set_timestamp(static_cast<uint64_t>(c_.wall.epochMillis(ch.time)));
             m.set_is_historical(true);
-            SparkplugMetric::Set(m, type->second, ch.value);
+            SparkplugMetric::Set(m, type, ch.value);
         }
         kept.pop_front();
     }

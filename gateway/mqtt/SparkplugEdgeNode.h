@@ -50,18 +50,24 @@ class SparkplugEdgeNode final : public MqttSession {
     struct Device {
         std::string node;
         std::string topicId;  // the node's name as a topic level
+        std::string dataTopic;
         bool born = false;
-        std::map<const TagEntry*, sparkplug::DataType> types;  // as the DBIRTH declared them
+        sparkplug::Payload data;               // this turn's DDATA, kept for its allocations
+        std::vector<const TagChange*> batch;   // the changes in `data`
     };
 
     void birth();
     void deviceBirth(Device& device);
     void deviceDeath(Device& device);
     void flush();
+    void sendData(Device& device);
     void replay();
     bool send(const std::string& topic, sparkplug::Payload& payload);
     Device& device(std::string_view node);
     Device* deviceById(std::string_view id);
+    sparkplug::DataType bornType(const TagEntry& tag) const {
+        return tag.position < types_.size() ? types_[tag.position] : sparkplug::Unknown;
+    }
     bool linkUp(std::string_view node) const;
     void hostState(std::string_view payload);
     void command(Device* device, std::string_view payload);
@@ -75,7 +81,12 @@ class SparkplugEdgeNode final : public MqttSession {
     uint64_t bdSeq_ = 0;
     uint64_t seq_ = 0;
     std::map<std::string, Device, std::less<>> devices_;  // by upper-cased node name
-    std::vector<TagChange> pending_;  // this turn's changes
+    std::vector<TagChange> pending_;   // this turn's changes
+    std::vector<TagChange> flushing_;  // the ones being sent (both keep their capacity)
+    std::string wire_;                 // the encoded payload, reused
+    // Each tag's data type as its device's DBIRTH declared it, by the tag's position;
+    // Unknown until then.
+    std::vector<sparkplug::DataType> types_;
     bool flushPosted_ = false;
     std::shared_ptr<bool> alive_ = std::make_shared<bool>(true);
 };

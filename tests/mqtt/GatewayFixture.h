@@ -10,10 +10,14 @@
 #include "MosquittoBroker.h"
 #include "MqttProbe.h"
 #include "core/ScopedRuntime.h"
+#include "core/node.h"
+#include "core/nodeDB.h"
 #include "gateway/TagDirectory.h"
 #include "gateway/mqtt/MqttPublisher.h"
 #include "platform/PollEventLoop.h"
 #include "platform/SystemClock.h"
+#include "sim/softplc/SoftPlcSimulator.h"
+#include "softplc/SoftPlcProject.h"
 #include "support/TempDir.h"
 
 namespace maroset::test {
@@ -43,6 +47,19 @@ class GatewayFixture : public ::testing::Test {
         MqttProbe& p = *probes_.back();
         EXPECT_TRUE(runUntil([&] { return p.subscribed(); }));
         return p;
+    }
+
+    // A soft-PLC node "PLC1" on a loopback simulator, its tag 41 named TankLevel, scanning.
+    std::shared_ptr<node> plc(sim::SoftPlcSimulator& sim) {
+        nodeDB& db = *runtime().nodes();
+        db.AddAllNodes(SoftPlcProject(dir_.path() / "project.db",
+                                      "('PLC1', 'NUVTCPIP', 1000, '127.0.0.1', " +
+                                          std::to_string(sim.port()) + ")"));
+        tags_.add("PLC1", 41, "Level", "TankLevel");
+        auto n = db.getNode("PLC1");
+        n->AddTag(41, "Level");
+        db.StartScanning();
+        return n;
     }
 
     // A link incident for the node, as its driver tells when the link opens or closes.

@@ -11,8 +11,6 @@
 #include "gateway/EventStream.h"
 #include "gateway/ServeApi.h"
 #include "gateway/TagBook.h"
-#include "sim/softplc/SoftPlcSimulator.h"
-#include "softplc/SoftPlcProject.h"
 
 namespace maroset {
 namespace {
@@ -70,16 +68,9 @@ TEST_F(JsonMode, ValuesStateAndLinkAreRetainedForLateSubscribers) {
 
 TEST_F(JsonMode, TheLinkTopicFollowsTheNodesLinkState) {
     auto sim = sim::SoftPlcSimulator::OnLoopback(0, {100, 0});
-    nodeDB& db = *runtime().nodes();
-    db.AddAllNodes(test::SoftPlcProject(dir_.path() / "project.db",
-                                        "('PLC1', 'NUVTCPIP', 1000, '127.0.0.1', " +
-                                            std::to_string(sim->port()) + ")"));
-    tags_.add("PLC1", 41, "Level", "TankLevel");
     auto& watcher = probe("maroset/PLC1/#");
     startPublisher(options());
-    auto plc = db.getNode("PLC1");
-    plc->AddTag(41, "Level");
-    db.StartScanning();
+    auto p = plc(*sim);
     const auto lastState = [&] {
         const auto links = watcher.on("maroset/PLC1/$link");
         if (links.empty()) return std::string();
@@ -100,14 +91,7 @@ TEST_F(JsonMode, TheLinkTopicFollowsTheNodesLinkState) {
 
 TEST_F(JsonMode, SetWritesReachTheDeviceOnlyWhenAllowed) {
     auto sim = sim::SoftPlcSimulator::OnLoopback(0, {0, 0});
-    nodeDB& db = *runtime().nodes();
-    db.AddAllNodes(test::SoftPlcProject(dir_.path() / "project.db",
-                                        "('PLC1', 'NUVTCPIP', 1000, '127.0.0.1', " +
-                                            std::to_string(sim->port()) + ")"));
-    tags_.add("PLC1", 41, "Level", "TankLevel");
-    auto plc = db.getNode("PLC1");
-    plc->AddTag(41, "Level");
-    db.StartScanning();
+    auto p = plc(*sim);
     ASSERT_TRUE(runUntil([&] { return sim->clients() == 1; }));
 
     auto& client = probe("maroset/$errors");

@@ -8,8 +8,6 @@
 #include "GatewayFixture.h"
 #include "core/node.h"
 #include "core/nodeDB.h"
-#include "sim/softplc/SoftPlcSimulator.h"
-#include "softplc/SoftPlcProject.h"
 #include "mqtt/sparkplug_b.pb.h"
 
 namespace maroset {
@@ -32,18 +30,6 @@ class Sparkplug : public test::GatewayFixture {
         o.setSparkplug("Plant/Line1");
         o.allowWrites = writes;
         return o;
-    }
-    // A soft-PLC node "PLC1" on a loopback simulator, its tag 41 named TankLevel.
-    std::shared_ptr<node> plc(sim::SoftPlcSimulator& sim) {
-        nodeDB& db = *runtime().nodes();
-        db.AddAllNodes(test::SoftPlcProject(dir_.path() / "project.db",
-                                            "('PLC1', 'NUVTCPIP', 1000, '127.0.0.1', " +
-                                                std::to_string(sim.port()) + ")"));
-        tags_.add("PLC1", 41, "Level", "TankLevel");
-        auto n = db.getNode("PLC1");
-        n->AddTag(41, "Level");
-        db.StartScanning();
-        return n;
     }
     static Payload decode(const test::MqttProbe::Message& m) {
         Payload p;
