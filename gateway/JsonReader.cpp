@@ -41,7 +41,7 @@ void JsonReader::skipBlanks() {
 }
 
 JsonValue JsonReader::value(int depth) {
-    if (depth > MaxDepth) fail("JSON nested too deeply");
+    if ((peek() == '{' || peek() == '[') && depth >= MaxDepth) fail("JSON nested too deeply");
     switch (peek()) {
         case '{':
             return object(depth + 1);
@@ -92,7 +92,8 @@ JsonValue JsonReader::object(int depth) {
         if (peek() != ':') fail("expected ':'");
         ++pos_;
         skipBlanks();
-        v.members.emplace_back(std::move(name), value(depth));
+        v.values.push_back(value(depth));
+        v.names.push_back(std::move(name));
         skipBlanks();
         if (peek() == ',') {
             ++pos_;
@@ -142,10 +143,14 @@ uint32_t JsonReader::hex4() {
     for (int i = 0; i < 4; ++i) {
         const char c = text_[pos_++];
         code <<= 4;
-        if (c >= '0' && c <= '9') code |= static_cast<uint32_t>(c - '0');
-        else if (c >= 'a' && c <= 'f') code |= static_cast<uint32_t>(c - 'a' + 10);
-        else if (c >= 'A' && c <= 'F') code |= static_cast<uint32_t>(c - 'A' + 10);
-        else fail("bad \\u escape");
+        if (c >= '0' && c <= '9')
+            code |= static_cast<uint32_t>(c - '0');
+        else if (c >= 'a' && c <= 'f')
+            code |= static_cast<uint32_t>(c - 'a' + 10);
+        else if (c >= 'A' && c <= 'F')
+            code |= static_cast<uint32_t>(c - 'A' + 10);
+        else
+            fail("bad \\u escape");
     }
     return code;
 }
@@ -166,15 +171,32 @@ std::string JsonReader::string() {
             if (atEnd()) fail("unterminated string");
             const char e = text_[pos_++];
             switch (e) {
-                case '"': case '\\': case '/': out += e; break;
-                case 'b': out += '\b'; break;
-                case 'f': out += '\f'; break;
-                case 'n': out += '\n'; break;
-                case 'r': out += '\r'; break;
-                case 't': out += '\t'; break;
+                case '"':
+                case '\\':
+                case '/':
+                    out += e;
+                    break;
+                case 'b':
+                    out += '\b';
+                    break;
+                case 'f':
+                    out += '\f';
+                    break;
+                case 'n':
+                    out += '\n';
+                    break;
+                case 'r':
+                    out += '\r';
+                    break;
+                case 't':
+                    out += '\t';
+                    break;
                 // A surrogate is always beyond Latin-1, so put() refuses it.
-                case 'u': put(hex4()); break;
-                default: fail("bad escape in a string");
+                case 'u':
+                    put(hex4());
+                    break;
+                default:
+                    fail("bad escape in a string");
             }
             continue;
         }

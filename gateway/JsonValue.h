@@ -1,7 +1,7 @@
 #pragma once
 
 #include <string>
-#include <utility>
+#include <string_view>
 #include <vector>
 
 namespace maroset::gateway {
@@ -17,16 +17,13 @@ struct JsonValue {
     bool integral = false;  // written without fraction or exponent, and fits 32 bits
     std::string text;
     std::vector<JsonValue> items;
-    std::vector<std::pair<std::string, JsonValue>> members;
+    // An object's members: names[i] is the name of values[i]. (Two lists, not one of pairs:
+    // a pair cannot hold the type it is part of.)
+    std::vector<std::string> names;
+    std::vector<JsonValue> values;
 
     // The last member named name; null when there is none (or this is not an object).
-    const JsonValue* member(std::string_view name) const {
-        const JsonValue* found = nullptr;
-        for (const auto& [key, value] : members) {
-            if (key == name) found = &value;
-        }
-        return found;
-    }
+    const JsonValue* member(std::string_view name) const;
 };
 
 }  // namespace maroset::gateway

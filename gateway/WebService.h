@@ -37,6 +37,7 @@ class WebService {
 
     // "http://HOST:PORT/"
     std::string url() const;
+    uint16_t port() const { return server_.port(); }
     bool writesAllowed() const { return writes_.allowed; }
     // Shows the MQTT side in the node list and the metrics.
     void attach(const MqttPublisher& mqtt) { api_.attach(mqtt); }
