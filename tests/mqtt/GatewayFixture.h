@@ -62,12 +62,6 @@ class GatewayFixture : public ::testing::Test {
         return n;
     }
 
-    // A link incident for the node, as its driver tells when the link opens or closes.
-    void tell(const std::string& node, platform::IncidentKind kind) {
-        runtime().incidents().report(node, kind, "127.0.0.1",
-                                     [] { return std::string("told by the test"); });
-    }
-
     bool runUntil(const std::function<bool()>& done,
                   std::chrono::milliseconds limit = std::chrono::seconds(10)) {
         const auto deadline = loop().now() + limit;
