@@ -11,7 +11,10 @@
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/nodeDB.h"
+#include "gateway/TagDirectory.h"
 #include "gateway/TagTable.h"
+#include "gateway/mqtt/MqttOptions.h"
+#include "gateway/mqtt/MqttPublisher.h"
 #include "lang/VbError.h"
 
 namespace maroset::cli {
@@ -30,7 +33,25 @@ const char* const ServeCommand::Usage =
     "  --allow-writes     let clients write tags (POST /api/tags/NODE/HANDLE)\n"
     "  --token TOKEN      every write needs 'Authorization: Bearer TOKEN'; an address other\n"
     "                     than loopback refuses writes without one\n"
-    "  --drive-root, --com, --modbus-port, --trap, --trace   as for 'maroset run'\n";
+    "  --drive-root, --com, --modbus-port, --trap, --trace   as for 'maroset run'\n"
+    "\n"
+    "MQTT (see the README for the topics):\n"
+    "  --mqtt mqtt://HOST[:PORT]   publish to this broker (mqtts:// with --mqtt-ca FILE)\n"
+    "  --mqtt-user U, --mqtt-password-file F, --mqtt-client-id ID\n"
+    "  --mqtt-prefix P             plain JSON topics under P (default maroset)\n"
+    "  --mqtt-buffer N             changes kept while the broker is away (default 100000)\n"
+    "  --sparkplug GROUP/EDGE      be a Sparkplug B edge node instead\n"
+    "  --sparkplug-host ID         publish only while that primary host is online\n"
+    "  --allow-writes also lets the broker's clients write (set topics, DCMD)\n";
+
+namespace {
+
+// The MQTT side's flags, each with a value that MqttOptions reads.
+constexpr const char* kMqttFlags[] = {"mqtt",           "mqtt-ca",     "mqtt-user",
+                                      "mqtt-password-file", "mqtt-client-id", "mqtt-prefix",
+                                      "mqtt-buffer",    "sparkplug",   "sparkplug-host"};
+
+}  // namespace
 
 void ServeCommand::ParseListen(const std::string& text, gateway::WebService::Settings& settings) {
     const auto colon = text.rfind(':');
@@ -51,9 +72,11 @@ int ServeCommand::Main(const std::vector<std::string>& args) {
     declared.push_back({"http", true});
     declared.push_back({"allow-writes"});
     declared.push_back({"token", true});
+    for (const char* flag : kMqttFlags) declared.push_back({flag, true});
     CommandLine cl(declared);
     HostOptions options;
     gateway::WebService::Settings web;
+    gateway::MqttOptions mqtt;
     try {
         cl.parse(args);
         if (cl.help()) {
@@ -67,6 +90,13 @@ int ServeCommand::Main(const std::vector<std::string>& args) {
         web.allowWrites = cl.has("allow-writes");
         web.token = cl.value("token").value_or("");
         if (cl.has("token") && web.token.empty()) throw UsageError("option '--token' is empty");
+        for (const char* flag : kMqttFlags)
+            if (auto value = cl.value(flag)) mqtt.take(std::string("--") + flag, [&] { return *value; });
+        mqtt.allowWrites = web.allowWrites;
+        mqtt.validate();
+    } catch (const std::invalid_argument& e) {
+        std::cerr << "maroset serve: " << e.what() << "\n" << Usage;
+        return 2;
     } catch (const UsageError& e) {
         std::cerr << "maroset serve: " << e.what() << "\n" << Usage;
         return 2;
@@ -125,6 +155,25 @@ int ServeCommand::Main(const std::vector<std::string>& args) {
     if (web.allowWrites && !service->writesAllowed())
         report("writes refused: " + web.host + " is not loopback and no --token was given");
     std::cout << "maroset serve: listening on " << service->url() << std::endl;
+
+    // Declared after the service, so it goes first.
+    std::optional<gateway::TagDirectory> directory;
+    std::optional<gateway::MqttPublisher> publisher;
+    if (mqtt.enabled()) {
+        try {
+            directory.emplace(tags);
+            publisher.emplace(rt, *directory, mqtt);
+        } catch (const std::runtime_error& e) {
+            report(e.what());
+            return 1;
+        }
+        service->attach(*publisher);
+        publisher->start();
+        std::cout << "maroset serve: publishing to " << mqtt.endpoint()
+                  << (mqtt.sparkplug() ? " as Sparkplug edge node " + mqtt.group + "/" + mqtt.edge
+                                       : " under " + mqtt.prefix + "/")
+                  << std::endl;
+    }
 
     platform::EventLoop& loop = rt.loop();
     StopSignal stop(loop, [&] { loop.stop(); });

@@ -16,6 +16,21 @@ JsonValue JsonReader::Parse(std::string_view text) {
     return v;
 }
 
+Variant JsonReader::ToVariant(const JsonValue& v) {
+    switch (v.kind) {
+        case JsonValue::Kind::Null:
+            return Variant::Null();
+        case JsonValue::Kind::Boolean:
+            return Variant(v.boolean);
+        case JsonValue::Kind::Number:
+            return v.integral ? Variant(static_cast<int32_t>(v.number)) : Variant(v.number);
+        case JsonValue::Kind::String:
+            return Variant(v.text);
+        default:
+            throw Error("a value must be a number, text, true, false or null");
+    }
+}
+
 void JsonReader::fail(const std::string& what) const {
     throw Error(what + " at byte " + std::to_string(pos_));
 }

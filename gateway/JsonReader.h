@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "gateway/JsonValue.h"
+#include "lang/Variant.h"
 
 namespace maroset::gateway {
 
@@ -25,6 +26,9 @@ class JsonReader {
     static constexpr int MaxDepth = 32;
 
     static JsonValue Parse(std::string_view text);
+    // The library's value for a scalar: whole numbers that fit as Long, others as Double, as
+    // `maroset run` reads a number typed on its command line. An array or object is an Error.
+    static Variant ToVariant(const JsonValue& v);
 
   private:
     explicit JsonReader(std::string_view text) : text_(text) {}

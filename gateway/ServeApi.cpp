@@ -8,28 +8,12 @@
 #include "gateway/LinkStatusJson.h"
 #include "gateway/PrometheusText.h"
 #include "gateway/WebAssets.h"
+#include "gateway/mqtt/MqttPublisher.h"
 #include "lang/VbError.h"
 
 namespace maroset::gateway {
 
 namespace {
-
-// The library's value for a JSON value: whole numbers that fit as Long, others as Double,
-// as `maroset run` reads a number typed on its command line.
-Variant toVariant(const JsonValue& v) {
-    switch (v.kind) {
-        case JsonValue::Kind::Null:
-            return Variant::Null();
-        case JsonValue::Kind::Boolean:
-            return Variant(v.boolean);
-        case JsonValue::Kind::Number:
-            return v.integral ? Variant(static_cast<int32_t>(v.number)) : Variant(v.number);
-        case JsonValue::Kind::String:
-            return Variant(v.text);
-        default:
-            throw JsonReader::Error("a value must be a number, text, true, false or null");
-    }
-}
 
 // Token comparison whose time does not depend on where the first difference is.
 bool sameSecret(std::string_view a, std::string_view b) {
@@ -65,8 +49,10 @@ HttpResponse ServeApi::handle(const HttpRequest& request) {
     }
     if (path == "/metrics") {
         return only(get, [&] {
-            return HttpResponse{200, "text/plain; version=0.0.4; charset=utf-8",
-                                PrometheusText::Render(links_.All()), nullptr};
+            std::string text = PrometheusText::Render(links_.All());
+            if (mqtt_) text += mqtt_->status().prometheus();
+            return HttpResponse{200, "text/plain; version=0.0.4; charset=utf-8", std::move(text),
+                                nullptr};
         });
     }
     if (const WebAssets::File* file = WebAssets::Find(path)) {
@@ -82,6 +68,7 @@ HttpResponse ServeApi::nodes() const {
     JsonWriter j;
     j.beginArray();
     for (const LinkStatus& s : links_.All()) LinkStatusJson::Write(j, s);
+    if (mqtt_) mqtt_->status().writeJson(j);
     return HttpResponse::Json(j.endArray().str());
 }
 
@@ -133,12 +120,12 @@ HttpResponse ServeApi::write(const HttpRequest& request, std::string_view target
             return HttpResponse::Error(400, "the body must be {\"value\": V}");
         if (v->kind == JsonValue::Kind::Array) {
             std::vector<Variant> list;
-            for (const JsonValue& item : v->items) list.push_back(toVariant(item));
+            for (const JsonValue& item : v->items) list.push_back(JsonReader::ToVariant(item));
             if (list.empty()) return HttpResponse::Error(400, "an array to write is empty");
             items = VbArray<Variant>(0, std::move(list));
             isArray = true;
         } else {
-            value = toVariant(*v);
+            value = JsonReader::ToVariant(*v);
         }
     } catch (const JsonReader::Error& e) {
         return HttpResponse::Error(400, std::string("malformed JSON: ") + e.what());

@@ -14,6 +14,8 @@ class nodeDB;
 
 namespace maroset::gateway {
 
+class MqttPublisher;
+
 // The service's HTTP API, as one function of a whole request, so it is tested and fuzzed
 // without a socket:
 //
@@ -39,6 +41,8 @@ class ServeApi {
              WritePolicy writes);
 
     HttpResponse handle(const HttpRequest& request);
+    // Adds the MQTT side to the node list (a `$mqtt` entry) and to the metrics.
+    void attach(const MqttPublisher& mqtt) { mqtt_ = &mqtt; }
 
   private:
     HttpResponse nodes() const;
@@ -50,6 +54,7 @@ class ServeApi {
     TagBook& tags_;
     EventStream& events_;
     WritePolicy writes_;
+    const MqttPublisher* mqtt_ = nullptr;
 };
 
 }  // namespace maroset::gateway

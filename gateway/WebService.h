@@ -39,6 +39,8 @@ class WebService {
     std::string url() const;
     uint16_t port() const { return server_.port(); }
     bool writesAllowed() const { return writes_.allowed; }
+    // Shows the MQTT side in the node list and the metrics.
+    void attach(const MqttPublisher& mqtt) { api_.attach(mqtt); }
 
     // Whether host is an IPv4 loopback address (127.0.0.0/8).
     static bool IsLoopback(const std::string& host);
