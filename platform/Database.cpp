@@ -24,20 +24,35 @@ void RefuseNul(const fs::path& file) {
                                                 "path name is spelled correctly.");
 }
 
+// Whether fresh connections already write with full syncs, as SQLite is built by default;
+// asked once, so connections need no statement of their own to set it.
+bool SyncsFullByDefault() {
+    static const bool full = [] {
+        sqlite3* db = nullptr;
+        sqlite3_open_v2(":memory:", &db, SQLITE_OPEN_READWRITE, nullptr);
+        sqlite3_stmt* s = nullptr;
+        sqlite3_prepare_v2(db, "PRAGMA synchronous", -1, &s, nullptr);
+        const bool yes = sqlite3_step(s) == SQLITE_ROW && sqlite3_column_int(s, 0) == 2;
+        sqlite3_finalize(s);
+        sqlite3_close(db);
+        return yes;
+    }();
+    return full;
+}
+
 std::shared_ptr<SqliteConnection> Connect(const fs::path& file) {
     sqlite3* db = nullptr;
     const int rc = sqlite3_open_v2(file.c_str(), &db, SQLITE_OPEN_READWRITE, nullptr);
     auto connection = std::make_shared<SqliteConnection>(db, file);
     if (rc != SQLITE_OK) connection->Fail(rc, "");
     // Each write is on the disk before the call that made it returns.
-    connection->Run("PRAGMA synchronous = FULL");
+    if (!SyncsFullByDefault()) connection->Run("PRAGMA synchronous = FULL");
+    // SQLite reads nothing until the first statement: read the schema now, so that a file that
+    // is not a database fails here, as the original engine failed on opening it.
+    const int schema = sqlite3_table_column_metadata(db, "main", "sqlite_master", nullptr, nullptr,
+                                                     nullptr, nullptr, nullptr, nullptr);
+    if (schema != SQLITE_OK) connection->Fail(schema, "");
     return connection;
-}
-
-// SQLite reads nothing until the first statement: look at the schema now so that a file that
-// is not a database fails here, as the original engine failed on opening it.
-void CheckFormat(const SqliteConnection& connection) {
-    connection.Run("SELECT count(*) FROM sqlite_master");
 }
 
 void SyncFolder(const fs::path& folder) {
@@ -84,9 +99,7 @@ std::unique_ptr<Database> Database::Open(const fs::path& file) {
     std::error_code ec;
     if (!fs::is_regular_file(file, ec))
         throw VbError(err::CouldNotFindFile, "Could not find file '" + file.string() + "'.");
-    auto connection = Connect(file);
-    CheckFormat(*connection);
-    return std::unique_ptr<Database>(new Database(std::move(connection)));
+    return std::unique_ptr<Database>(new Database(Connect(file)));
 }
 
 std::unique_ptr<Database> Database::Create(const fs::path& file,
