@@ -11,9 +11,9 @@
 
 namespace maroset::fuzz {
 
-// A fresh runtime on a virtual loop whose only soft-PLC server is an in-memory one at
-// "plc":5000 that swallows what the client sends; `link` is its connection once a client
-// has connected.
+// A runtime on a virtual loop whose only soft-PLC server is an in-memory one at "plc":5000
+// that swallows what the client sends; `link` is the latest connection a client made. Built
+// once per fuzzing process: each input brings its own driver and leaves it shut down.
 struct SoftPlcFuzzLine {
     SoftPlcFuzzLine() : scope(makeRuntime(loop)) {
         scope->tcp().setRealSockets(false);

@@ -40,15 +40,16 @@ struct Reader {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-    fuzz::SoftPlcFuzzLine line;
-    platform::VirtualEventLoop& loop = *line.loop;
-    std::shared_ptr<platform::MemoryTcpLink>& link = line.link;
-
-    ClsNodeDBInterface host;
-    auto values =
+    // The runtime and the host are built once per process; each input has a node of its own.
+    static fuzz::SoftPlcFuzzLine line;
+    static ClsNodeDBInterface host;
+    static const auto values =
         host.ValueChange.subscribe([](VbArray<int32_t>& ids, int16_t count, VbArray<Variant>& v) {
             if (ids.size() != count || v.size() != count || ids.LBound() != 1) std::abort();
         });
+    platform::VirtualEventLoop& loop = *line.loop;
+    std::shared_ptr<platform::MemoryTcpLink>& link = line.link;
+    link.reset();
     auto plc = std::make_shared<node>();
     plc->Name = "PLC1";
     plc->DriverName = Variant("NUVTCPIP");
