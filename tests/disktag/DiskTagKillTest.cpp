@@ -159,7 +159,7 @@ TEST_F(DiskTagKills, EveryWriteReportedBeforeAKillIsInTheFile) {
             << "round " << round << ": reported " << last << ", file holds " << now;
         stored = now;
     }
-    EXPECT_GT(acknowledged, Rounds(1000) / 4) << "kills within " << std::chrono::duration<double, std::milli>(span * 2).count() << " ms" << "the kills came before any write";
+    EXPECT_GT(acknowledged, Rounds(1000) / 10) << "kills within " << std::chrono::duration<double, std::milli>(span * 2).count() << " ms" << "the kills came before any write";
 }
 
 }  // namespace
