@@ -21,6 +21,8 @@
 #include "platform/VirtualEventLoop.h"
 #include "platform/serial/MemorySerialCable.h"
 
+#include "SerialFuzzLine.h"
+
 namespace {
 
 using namespace maroset;
@@ -37,30 +39,12 @@ std::string Frame(const std::string& body) {
            std::string{0x10, 0x03, static_cast<char>(crc & 0xFF), static_cast<char>(crc >> 8)};
 }
 
-// Built once per process: the runtime on its virtual loop and the cable on port 1. Each input
-// ends with the link settled and the cable read out, so the next one starts as on a fresh line.
-struct Line {
-    Line() : scope(MakeRuntime(loop)), cable(*loop) {
-        scope->serialDevices().plug("/dev/ttyS0", cable.hostEnd());
-    }
-    static std::unique_ptr<Runtime> MakeRuntime(platform::VirtualEventLoop*& loopOut) {
-        auto owner = std::make_unique<platform::VirtualEventLoop>();
-        loopOut = owner.get();
-        auto clock = std::make_unique<platform::VirtualClock>(*owner, platform::ZeroDate);
-        return std::make_unique<Runtime>(std::move(owner), std::move(clock),
-                                         std::filesystem::temp_directory_path());
-    }
-
-    platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope;
-    platform::MemorySerialCable cable;
-};
 
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     if (size < 1) return 0;
-    static Line line;
+    static fuzz::SerialFuzzLine line;
     platform::VirtualEventLoop& loop = *line.loop;
     platform::MemorySerialCable& cable = line.cable;
 

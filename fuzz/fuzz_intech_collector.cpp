@@ -18,34 +18,20 @@
 #include "platform/VirtualEventLoop.h"
 #include "platform/serial/MemorySerialCable.h"
 
+#include "SerialFuzzLine.h"
+
 namespace {
 
 using namespace maroset;
 using namespace std::chrono_literals;
 
-// Built once per fuzzing process: the runtime on the virtual loop and its own clock (the
-// system clock would cost a call into the kernel at every reading), and the cable on port 1.
-struct Line {
-    Line() : scope(MakeRuntime(loop)), cable(*loop) {
-        scope->serialDevices().plug("/dev/ttyS0", cable.hostEnd());
-    }
-    static std::unique_ptr<Runtime> MakeRuntime(platform::VirtualEventLoop*& loopOut) {
-        auto owner = std::make_unique<platform::VirtualEventLoop>();
-        loopOut = owner.get();
-        auto clock = std::make_unique<platform::VirtualClock>(*owner, platform::ZeroDate);
-        return std::make_unique<Runtime>(std::move(owner), std::move(clock),
-                                         std::filesystem::temp_directory_path());
-    }
-
-    platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope;
-    platform::MemorySerialCable cable;
-};
 
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-    static Line line;
+    // Built once per process, with its own clock: the system clock would cost a call into
+    // the kernel at every reading.
+    static fuzz::SerialFuzzLine line;
     const std::string_view input(reinterpret_cast<const char*>(data), size);
 
     platform::MemorySerialCable& cable = line.cable;

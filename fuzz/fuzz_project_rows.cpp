@@ -29,6 +29,9 @@
 #include "platform/VirtualEventLoop.h"
 #include "platform/serial/MemorySerialCable.h"
 
+#include "FuzzInput.h"
+#include "FuzzRuntime.h"
+
 namespace {
 
 using namespace maroset;
@@ -42,7 +45,7 @@ constexpr const char* kDrivers[] = {"MEMTAG", "DiskTag", "opc", "NUVINTECH", "Nu
 // Built once: the runtime, its cables, and the project file with its table; each input only
 // replaces the rows.
 struct Project {
-    Project() : root(MakeRoot()), scope(MakeRuntime(root, loop)) {
+    Project() : root(MakeRoot()), scope(fuzz::VirtualRuntime(loop, root)) {
         scope->tcp().setRealSockets(false);
         for (int i = 0; i < 64; ++i) {
             cables.push_back(std::make_unique<platform::MemorySerialCable>(*loop));
@@ -76,13 +79,6 @@ struct Project {
         fs::create_directory(root, ec);
         return root;
     }
-    static std::unique_ptr<Runtime> MakeRuntime(const fs::path& root,
-                                                platform::VirtualEventLoop*& loopOut) {
-        auto owner = std::make_unique<platform::VirtualEventLoop>();
-        loopOut = owner.get();
-        auto clock = std::make_unique<platform::VirtualClock>(*owner, platform::ZeroDate);
-        return std::make_unique<Runtime>(std::move(owner), std::move(clock), root);
-    }
 
     fs::path root;
     platform::VirtualEventLoop* loop = nullptr;
@@ -93,29 +89,7 @@ struct Project {
     sqlite3_stmt* insert = nullptr;
 };
 
-struct Reader {
-    const uint8_t* data;
-    size_t size;
-    size_t at = 0;
-    bool more() const { return at < size; }
-    uint8_t byte() { return at < size ? data[at++] : 0; }
-    template <class T>
-    T number() {
-        T v{};
-        const size_t n = std::min(sizeof v, size - at);
-        std::memcpy(&v, data + at, n);
-        at += n;
-        return v;
-    }
-    std::string text(size_t n) {
-        n = std::min(n, size - at);
-        std::string out(reinterpret_cast<const char*>(data + at), n);
-        at += n;
-        return out;
-    }
-};
-
-void BindField(sqlite3_stmt* s, int column, Reader& in) {
+void BindField(sqlite3_stmt* s, int column, fuzz::FuzzInput& in) {
     const uint8_t kind = in.byte();
     switch (kind % 5) {
         case 0:
@@ -135,7 +109,7 @@ void BindField(sqlite3_stmt* s, int column, Reader& in) {
                 sqlite3_bind_text(s, column, name, -1, SQLITE_STATIC);
                 break;
             }
-            const std::string text = in.text(in.byte() % 48);
+            const std::string text = in.bytes(in.byte() % 48);
             sqlite3_bind_text(s, column, text.data(), static_cast<int>(text.size()),
                               SQLITE_TRANSIENT);
     }
@@ -145,7 +119,7 @@ void BindField(sqlite3_stmt* s, int column, Reader& in) {
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     static Project project;
-    Reader in{data, size};
+    fuzz::FuzzInput in{data, size};
     sqlite3_exec(project.db, "DELETE FROM Nodes", nullptr, nullptr, nullptr);
     for (int row = 0; row < 6 && in.more(); ++row) {
         for (int column = 1; column <= 10; ++column) BindField(project.insert, column, in);
