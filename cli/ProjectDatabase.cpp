@@ -2,8 +2,6 @@
 
 #include <strings.h>
 
-#include <system_error>
-
 #include "lang/Conversions.h"
 #include "lang/VbError.h"
 #include "platform/Database.h"
@@ -18,18 +16,10 @@ constexpr const char* kQuery = "select * from Nodes ";
 }  // namespace
 
 void ProjectDatabase::Create(const std::filesystem::path& file) {
-    auto db = platform::Database::Create(file);
-    try {
-        db->Execute(
-            "CREATE TABLE Nodes (Name TEXT, Driver TEXT, OPCServer TEXT, OPCTopic TEXT, "
-            "UpdateRate INTEGER, CommPort INTEGER, BaudRate INTEGER, TagPrefex TEXT, "
-            "IPAddress TEXT, Port INTEGER)");
-    } catch (...) {
-        db.reset();
-        std::error_code ec;
-        std::filesystem::remove(file, ec);  // no project without its table stays behind
-        throw;
-    }
+    platform::Database::Create(
+        file, {"CREATE TABLE Nodes (Name TEXT, Driver TEXT, OPCServer TEXT, OPCTopic TEXT, "
+               "UpdateRate INTEGER, CommPort INTEGER, BaudRate INTEGER, TagPrefex TEXT, "
+               "IPAddress TEXT, Port INTEGER)"});
 }
 
 void ProjectDatabase::AddNode(const std::filesystem::path& file, const std::vector<Field>& fields) {

@@ -9,13 +9,15 @@
 #include "platform/VirtualEventLoop.h"
 #include "platform/tcp/MemoryTcpLink.h"
 
+#include "FuzzRuntime.h"
+
 namespace maroset::fuzz {
 
-// A fresh runtime on a virtual loop whose only soft-PLC server is an in-memory one at
-// "plc":5000 that swallows what the client sends; `link` is its connection once a client
-// has connected.
+// A runtime on a virtual loop whose only soft-PLC server is an in-memory one at "plc":5000
+// that swallows what the client sends; `link` is the latest connection a client made. Built
+// once per fuzzing process: each input brings its own driver and leaves it shut down.
 struct SoftPlcFuzzLine {
-    SoftPlcFuzzLine() : scope(makeRuntime(loop)) {
+    SoftPlcFuzzLine() : scope(VirtualRuntime(loop)) {
         scope->tcp().setRealSockets(false);
         scope->tcp().plug("plc", 5000, [this](const std::shared_ptr<platform::MemoryTcpLink>& l) {
             link = l;
@@ -27,14 +29,6 @@ struct SoftPlcFuzzLine {
     ScopedRuntime scope;
     std::shared_ptr<platform::MemoryTcpLink> link;
 
-  private:
-    static std::unique_ptr<Runtime> makeRuntime(platform::VirtualEventLoop*& loopOut) {
-        auto owner = std::make_unique<platform::VirtualEventLoop>();
-        loopOut = owner.get();
-        auto clock = std::make_unique<platform::VirtualClock>(*owner, platform::ZeroDate);
-        return std::make_unique<Runtime>(std::move(owner), std::move(clock),
-                                         std::filesystem::temp_directory_path());
-    }
 };
 
 }  // namespace maroset::fuzz

@@ -21,6 +21,8 @@
 #include "platform/VirtualEventLoop.h"
 #include "platform/serial/MemorySerialCable.h"
 
+#include "SerialFuzzLine.h"
+
 namespace {
 
 using namespace maroset;
@@ -37,17 +39,14 @@ std::string Frame(const std::string& body) {
            std::string{0x10, 0x03, static_cast<char>(crc & 0xFF), static_cast<char>(crc >> 8)};
 }
 
+
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     if (size < 1) return 0;
-    auto loopOwner = std::make_unique<platform::VirtualEventLoop>();
-    platform::VirtualEventLoop& loop = *loopOwner;
-    auto clock = std::make_unique<platform::VirtualClock>(loop, platform::ZeroDate);
-    ScopedRuntime runtime(std::make_unique<Runtime>(std::move(loopOwner), std::move(clock),
-                                                    std::filesystem::temp_directory_path()));
-    platform::MemorySerialCable cable(loop);
-    runtime->serialDevices().plug("/dev/ttyS0", cable.hostEnd());
+    static fuzz::SerialFuzzLine line;
+    platform::VirtualEventLoop& loop = *line.loop;
+    platform::MemorySerialCable& cable = line.cable;
 
     const uint8_t words = data[0] % 32;
     FrmNUVProSerial owner("PLC");
@@ -99,5 +98,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     for (int w = 0; w < words; ++w) {
         if (!(last(w) == Variant(static_cast<int16_t>(0x1000 + w)))) abort();
     }
+    cable.takeHostSent();  // the ACK of that reply
+    cable.takeDeviceSent();
     return 0;
 }

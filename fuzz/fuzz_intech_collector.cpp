@@ -14,33 +14,27 @@
 #include "drivers/intech/ClsDriverIntech.h"
 #include "drivers/intech/FrmNUVIntech.h"
 #include "lang/VbError.h"
-#include "platform/SystemClock.h"
+#include "platform/VirtualClock.h"
 #include "platform/VirtualEventLoop.h"
 #include "platform/serial/MemorySerialCable.h"
+
+#include "SerialFuzzLine.h"
 
 namespace {
 
 using namespace maroset;
 using namespace std::chrono_literals;
 
-struct Line {
-    Line()
-        : scope(std::make_unique<Runtime>(std::make_unique<platform::VirtualEventLoop>(),
-                                          std::make_unique<platform::SystemClock>(),
-                                          std::filesystem::temp_directory_path())),
-          loop(static_cast<platform::VirtualEventLoop&>(scope->loop())) {}
-    ScopedRuntime scope;
-    platform::VirtualEventLoop& loop;
-};
 
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-    static Line line;
+    // Built once per process, with its own clock: the system clock would cost a call into
+    // the kernel at every reading.
+    static fuzz::SerialFuzzLine line;
     const std::string_view input(reinterpret_cast<const char*>(data), size);
 
-    platform::MemorySerialCable cable(line.loop);
-    line.scope->serialDevices().plug("/dev/ttyS0", cable.hostEnd());
+    platform::MemorySerialCable& cable = line.cable;
     auto driver = std::make_shared<ClsDriverIntech>();
     driver->ScanRate(Variant(int32_t{100}));
     driver->startup(" ", "Meter");
@@ -50,11 +44,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     FrmNUVIntech& owner = *driver->NUVIntech();
 
     // The bytes as the line delivers them, one receive event per character.
-    line.loop.advance(100ms);
+    line.loop->advance(100ms);
     cable.deviceEnd()->write(input);
-    line.loop.advance(0ms);
+    line.loop->advance(0ms);
     cable.takeHostSent();
-    line.loop.advance(100ms);
+    line.loop->advance(100ms);
     const std::string sent = cable.takeHostSent();
     if (sent.empty() || sent.back() != '\r') std::abort();  // polling stalled
 
@@ -68,7 +62,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     } catch (const VbError&) {
         // A field that is not a number is a run-time error, as on the line.
     }
-    line.loop.advance(0ms);
+    line.loop->advance(0ms);
     driver->shutdown();
+    cable.takeHostSent();
+    cable.takeDeviceSent();
     return 0;
 }

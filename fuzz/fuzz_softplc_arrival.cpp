@@ -17,38 +17,22 @@
 #include "core/node.h"
 #include "drivers/softplc/MessageFrame.h"
 
+#include "FuzzInput.h"
 #include "SoftPlcFuzzLine.h"
 
 using namespace maroset;
 
-namespace {
-
-struct Reader {
-    const uint8_t* data;
-    size_t size;
-    size_t at = 0;
-    bool more() const { return at < size; }
-    uint8_t byte() { return at < size ? data[at++] : 0; }
-    std::string bytes(size_t n) {
-        n = std::min(n, size - at);
-        std::string out(reinterpret_cast<const char*>(data + at), n);
-        at += n;
-        return out;
-    }
-};
-
-}  // namespace
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-    fuzz::SoftPlcFuzzLine line;
-    platform::VirtualEventLoop& loop = *line.loop;
-    std::shared_ptr<platform::MemoryTcpLink>& link = line.link;
-
-    ClsNodeDBInterface host;
-    auto values =
+    // The runtime and the host are built once per process; each input has a node of its own.
+    static fuzz::SoftPlcFuzzLine line;
+    static ClsNodeDBInterface host;
+    static const auto values =
         host.ValueChange.subscribe([](VbArray<int32_t>& ids, int16_t count, VbArray<Variant>& v) {
             if (ids.size() != count || v.size() != count || ids.LBound() != 1) std::abort();
         });
+    platform::VirtualEventLoop& loop = *line.loop;
+    std::shared_ptr<platform::MemoryTcpLink>& link = line.link;
+    link.reset();
     auto plc = std::make_shared<node>();
     plc->Name = "PLC1";
     plc->DriverName = Variant("NUVTCPIP");
@@ -60,7 +44,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     plc->IsActive(true);
     if (!link) std::abort();
 
-    Reader in{data, size};
+    fuzz::FuzzInput in{data, size};
     std::string stream;
     int32_t number = 0;
     while (in.more()) {

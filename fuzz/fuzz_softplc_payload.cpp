@@ -22,16 +22,19 @@
 using namespace maroset;
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-    fuzz::SoftPlcFuzzLine line;
-    platform::VirtualEventLoop& loop = *line.loop;
-    std::shared_ptr<platform::MemoryTcpLink>& link = line.link;
-    int64_t reported = 0;
-    ClsNodeDBInterface host;
-    auto values =
-        host.ValueChange.subscribe([&](VbArray<int32_t>& ids, int16_t count, VbArray<Variant>& v) {
+    // The runtime and the host are built once per process; each input has a driver of its own.
+    static fuzz::SoftPlcFuzzLine line;
+    static int64_t reported;
+    static ClsNodeDBInterface host;
+    static const auto values =
+        host.ValueChange.subscribe([](VbArray<int32_t>& ids, int16_t count, VbArray<Variant>& v) {
             if (ids.size() != count || v.size() != count || v.LBound() != 1) std::abort();
             reported += count;
         });
+    platform::VirtualEventLoop& loop = *line.loop;
+    std::shared_ptr<platform::MemoryTcpLink>& link = line.link;
+    reported = 0;
+    link.reset();
 
     const std::string input(reinterpret_cast<const char*>(data), size);
     auto driver = std::make_shared<ClsDriverNUVSoftPLC>();

@@ -122,6 +122,16 @@ std::optional<double> ParseNumber(std::string_view text) {
     bool negative = false;
     if (s[i] == '+' || s[i] == '-') negative = s[i++] == '-';
 
+    // Plain whole numbers (handles, counts) are most of the text that is converted: up to 15
+    // digits are exact in a Double, so they need no text for from_chars.
+    if (s.size() - i <= 15 && s.size() > i &&
+        s.find_first_not_of("0123456789", i) == std::string_view::npos) {
+        int64_t whole = 0;
+        for (; i < s.size(); ++i) whole = whole * 10 + (s[i] - '0');
+        const double value = static_cast<double>(whole);
+        return negative ? -value : value;
+    }
+
     // Mantissa digits without separators, and where the point falls.
     std::string clean;
     clean.reserve(s.size());

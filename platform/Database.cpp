@@ -1,9 +1,11 @@
 #include "platform/Database.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdlib>
 #include <string_view>
 #include <system_error>
 
@@ -23,20 +25,35 @@ void RefuseNul(const fs::path& file) {
                                                 "path name is spelled correctly.");
 }
 
+// Whether fresh connections already write with full syncs, as SQLite is built by default;
+// asked once, so connections need no statement of their own to set it.
+bool SyncsFullByDefault() {
+    static const bool full = [] {
+        sqlite3* db = nullptr;
+        sqlite3_open_v2(":memory:", &db, SQLITE_OPEN_READWRITE, nullptr);
+        sqlite3_stmt* s = nullptr;
+        sqlite3_prepare_v2(db, "PRAGMA synchronous", -1, &s, nullptr);
+        const bool yes = sqlite3_step(s) == SQLITE_ROW && sqlite3_column_int(s, 0) == 2;
+        sqlite3_finalize(s);
+        sqlite3_close(db);
+        return yes;
+    }();
+    return full;
+}
+
 std::shared_ptr<SqliteConnection> Connect(const fs::path& file) {
     sqlite3* db = nullptr;
     const int rc = sqlite3_open_v2(file.c_str(), &db, SQLITE_OPEN_READWRITE, nullptr);
     auto connection = std::make_shared<SqliteConnection>(db, file);
     if (rc != SQLITE_OK) connection->Fail(rc, "");
     // Each write is on the disk before the call that made it returns.
-    connection->Run("PRAGMA synchronous = FULL");
+    if (!SyncsFullByDefault()) connection->Run("PRAGMA synchronous = FULL");
+    // SQLite reads nothing until the first statement: read the schema now, so that a file that
+    // is not a database fails here, as the original engine failed on opening it.
+    const int schema = sqlite3_table_column_metadata(db, "main", "sqlite_master", nullptr, nullptr,
+                                                     nullptr, nullptr, nullptr, nullptr);
+    if (schema != SQLITE_OK) connection->Fail(schema, "");
     return connection;
-}
-
-// SQLite reads nothing until the first statement: look at the schema now so that a file that
-// is not a database fails here, as the original engine failed on opening it.
-void CheckFormat(const SqliteConnection& connection) {
-    connection.Run("SELECT count(*) FROM sqlite_master");
 }
 
 void SyncFolder(const fs::path& folder) {
@@ -47,6 +64,35 @@ void SyncFolder(const fs::path& folder) {
     ::close(fd);
 }
 
+VbError Exists(const fs::path& file) {
+    return VbError(err::DatabaseExists, "Database '" + file.string() + "' already exists.");
+}
+
+VbError CannotCreate(const fs::path& file, int error) {
+    if (error == EACCES || error == EPERM || error == EROFS)
+        return VbError(dberr::CannotOpenFile,
+                       "The database engine cannot open the file '" + file.string() +
+                           "'. It is already opened exclusively by another user, or you need "
+                           "permission to view its data.");
+    return VbError(dberr::NotAValidPath, "'" + file.parent_path().string() +
+                                             "' is not a valid path. Make sure that the path "
+                                             "name is spelled correctly.");
+}
+
+// Gives the finished file at `building` its name. link() never replaces a file, so of two
+// creators only one wins; a blank file in the way is replaced by rename(), which is atomic.
+void Publish(const fs::path& building, const fs::path& file) {
+    if (::link(building.c_str(), file.c_str()) != 0) {
+        const int error = errno;
+        if (error != EEXIST) throw CannotCreate(file, error);
+        if (!Database::Blank(file)) throw Exists(file);
+        if (::rename(building.c_str(), file.c_str()) != 0) throw CannotCreate(file, errno);
+    }
+    std::error_code ec;
+    fs::remove(building, ec);
+    SyncFolder(file.parent_path());
+}
+
 }  // namespace
 
 std::unique_ptr<Database> Database::Open(const fs::path& file) {
@@ -54,40 +100,48 @@ std::unique_ptr<Database> Database::Open(const fs::path& file) {
     std::error_code ec;
     if (!fs::is_regular_file(file, ec))
         throw VbError(err::CouldNotFindFile, "Could not find file '" + file.string() + "'.");
-    auto connection = Connect(file);
-    CheckFormat(*connection);
-    return std::unique_ptr<Database>(new Database(std::move(connection)));
+    return std::unique_ptr<Database>(new Database(Connect(file)));
 }
 
-std::unique_ptr<Database> Database::Create(const fs::path& file) {
+std::unique_ptr<Database> Database::Create(const fs::path& file,
+                                           std::initializer_list<std::string_view> schema) {
     RefuseNul(file);
-    // Create the file exclusively ourselves, so two creators cannot both think they made it.
-    const int fd = ::open(file.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
-    if (fd < 0) {
-        const int error = errno;
-        if (error == EEXIST)
-            throw VbError(err::DatabaseExists, "Database '" + file.string() + "' already exists.");
-        if (error == EACCES || error == EPERM || error == EROFS)
-            throw VbError(dberr::CannotOpenFile,
-                          "The database engine cannot open the file '" + file.string() +
-                              "'. It is already opened exclusively by another user, or you "
-                              "need permission to view its data.");
-        throw VbError(dberr::NotAValidPath, "'" + file.parent_path().string() +
-                                                "' is not a valid path. Make sure that the "
-                                                "path name is spelled correctly.");
-    }
+    std::error_code ec;
+    if (fs::exists(file, ec) && !Blank(file)) throw Exists(file);
+    // A unique name, so two creators never build in one file; a kill leaves only this name.
+    std::string building = file.native() + ".XXXXXX";
+    const int fd = ::mkstemp(building.data());
+    if (fd < 0) throw CannotCreate(file, errno);
+    ::fchmod(fd, 0644);
     ::close(fd);
     try {
-        auto connection = Connect(file);
-        // Write the header now, so the new file is a database from the start.
-        connection->Run("PRAGMA application_id = 1296126803");  // "MRSS"
-        SyncFolder(file.parent_path());
-        return std::unique_ptr<Database>(new Database(std::move(connection)));
+        {
+            auto connection = Connect(building);
+            // Write the header first, so even a schema-less file is a database.
+            connection->Run("PRAGMA application_id = 1296126803");  // "MRSS"
+            for (const auto sql : schema) connection->Run(sql);
+        }  // closed: every page is on the disk before the file gets its name
+        Publish(building, file);
     } catch (...) {
-        // No half-made file stays behind to be taken for a database later.
-        std::error_code ec;
-        fs::remove(file, ec);
+        fs::remove(building, ec);
         throw;
+    }
+    return std::unique_ptr<Database>(new Database(Connect(file)));
+}
+
+bool Database::Blank(const fs::path& file) {
+    std::error_code ec;
+    if (!fs::is_regular_file(file, ec)) return false;
+    if (fs::file_size(file, ec) == 0 && !ec) return true;
+    sqlite3* db = nullptr;
+    const int rc = sqlite3_open_v2(file.c_str(), &db, SQLITE_OPEN_READONLY, nullptr);
+    const SqliteConnection connection(db, file);
+    if (rc != SQLITE_OK) return false;
+    try {
+        auto statement = connection.Prepare("SELECT count(*) FROM sqlite_master");
+        return connection.Step(statement.get(), "") && sqlite3_column_int(statement.get(), 0) == 0;
+    } catch (const VbError&) {
+        return false;  // not a database at all: not ours to replace
     }
 }
 

@@ -1,8 +1,10 @@
 #pragma once
 
 #include <filesystem>
+#include <initializer_list>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "lang/Variant.h"
@@ -36,9 +38,16 @@ class Database {
   public:
     // Opens an existing file (3024 when it does not exist).
     static std::unique_ptr<Database> Open(const std::filesystem::path& file);
-    // Creates a new, empty database file (3204 when the file exists, 3044 when its folder
-    // does not).
-    static std::unique_ptr<Database> Create(const std::filesystem::path& file);
+    // Creates a new database file and runs the statements of its schema in it (3204 when the
+    // file exists, 3044 when its folder does not). The file is built under a temporary name in
+    // the same folder and appears under its own name only when complete, so a process killed
+    // at any instant leaves either no file or the whole schema. A blank file (see Blank) counts
+    // as absent and is replaced.
+    static std::unique_ptr<Database> Create(const std::filesystem::path& file,
+                                            std::initializer_list<std::string_view> schema = {});
+    // True for a file that holds no table: zero-length, or a database without one. Creations
+    // that were cut short before files were made whole left such files; they hold no data.
+    static bool Blank(const std::filesystem::path& file);
 
     ~Database();
     Database(const Database&) = delete;

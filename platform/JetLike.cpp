@@ -141,7 +141,22 @@ class Pattern {
 
 }  // namespace
 
+bool JetPlainPattern(std::string_view pattern, std::optional<char> escape) {
+    return pattern.find_first_of("*?#[") == std::string_view::npos &&
+           (!escape || pattern.find(*escape) == std::string_view::npos);
+}
+
+bool JetSameText(std::string_view text, std::string_view pattern) {
+    if (text.size() != pattern.size()) return false;
+    for (size_t i = 0; i < text.size(); ++i)
+        if (Lower(static_cast<unsigned char>(text[i])) !=
+            Lower(static_cast<unsigned char>(pattern[i])))
+            return false;
+    return true;
+}
+
 bool JetLike(std::string_view text, std::string_view pattern, std::optional<char> escape) {
+    if (JetPlainPattern(pattern, escape)) return JetSameText(text, pattern);
     const Pattern p(pattern, escape);
     // A malformed pattern fails whatever the text, so read it all once first.
     for (size_t k = 0; k < p.size(); k = p.at(k).next) {

@@ -22,6 +22,12 @@ namespace maroset::platform {
 bool JetLike(std::string_view text, std::string_view pattern,
              std::optional<char> escape = std::nullopt);
 
+// Whether a pattern holds no wildcard (nor the escape character): it then matches exactly the
+// texts JetSameText accepts, the same letters in any case. Most patterns are plain tag names
+// tried against every row of a query; a caller may decide this once per query.
+bool JetPlainPattern(std::string_view pattern, std::optional<char> escape = std::nullopt);
+bool JetSameText(std::string_view text, std::string_view pattern);
+
 // The error number of a malformed pattern.
 inline constexpr int InvalidPatternString = 93;
 

@@ -105,25 +105,30 @@ bool Recordset::target() const {
     if (table_.empty()) return false;
     // A table without rowids cannot be changed through a recordset.
     sqlite3_stmt* probe = nullptr;
-    const std::string sql = "SELECT rowid FROM " + QuoteIdentifier(table_) + " LIMIT 0";
-    const bool hasRowid =
-        sqlite3_prepare_v2(connection_->handle(), sql.c_str(), -1, &probe, nullptr) == SQLITE_OK;
+    const std::string probeSql = "SELECT rowid FROM " + QuoteIdentifier(table_) + " LIMIT 0";
+    const bool hasRowid = sqlite3_prepare_v2(connection_->handle(), probeSql.c_str(), -1, &probe,
+                                             nullptr) == SQLITE_OK;
     sqlite3_finalize(probe);
     if (!hasRowid) return false;
     // The table's INTEGER PRIMARY KEY is its rowid: a field that is that column carries it.
-    auto info = connection_->Prepare(
-        "SELECT name, type, (SELECT count(*) FROM pragma_table_info(?1) WHERE pk > 0) "
-        "FROM pragma_table_info(?1) WHERE pk = 1");
-    sqlite3_bind_text(info.get(), 1, table_.data(), static_cast<int>(table_.size()),
-                      SQLITE_TRANSIENT);
-    if (connection_->Step(info.get(), "")) {
-        const std::string name = reinterpret_cast<const char*>(sqlite3_column_text(info.get(), 0));
-        const std::string type = reinterpret_cast<const char*>(sqlite3_column_text(info.get(), 1));
-        if (sqlite3_column_int(info.get(), 2) == 1 && NamesEqual(type, "INTEGER")) {
-            rowidName_ = name;
-            for (size_t i = 0; i < origins_.size(); ++i)
-                if (NamesEqual(origins_[i], name)) rowidField_ = static_cast<int>(i);
-        }
+    // PRAGMA table_info is the cheapest way to the keys: rows are edited one at a time, each
+    // time on a connection of its own.
+    const std::string sql = "PRAGMA table_info(" + QuoteIdentifier(table_) + ")";
+    auto info = connection_->Prepare(sql);
+    int keys = 0;
+    std::string name, type;
+    while (connection_->Step(info.get(), sql)) {
+        const int pk = sqlite3_column_int(info.get(), 5);
+        if (pk > 0) ++keys;
+        if (pk != 1) continue;
+        name = reinterpret_cast<const char*>(sqlite3_column_text(info.get(), 1));
+        const auto* declared = sqlite3_column_text(info.get(), 2);
+        type = declared ? reinterpret_cast<const char*>(declared) : "";
+    }
+    if (keys == 1 && NamesEqual(type, "INTEGER")) {
+        rowidName_ = name;
+        for (size_t i = 0; i < origins_.size(); ++i)
+            if (NamesEqual(origins_[i], name)) rowidField_ = static_cast<int>(i);
     }
     updatable_ = true;
     return true;

@@ -10,6 +10,8 @@ namespace {
 
 // like(pattern, text[, escape]): SQLite calls this for `text LIKE pattern [ESCAPE e]`.
 void LikeFunction(sqlite3_context* ctx, int argc, sqlite3_value** argv) {
+    if (argc != 2 && argc != 3)
+        return sqlite3_result_error(ctx, "wrong number of arguments to function like()", -1);
     for (int i = 0; i < argc; ++i)
         if (sqlite3_value_type(argv[i]) == SQLITE_NULL) return sqlite3_result_null(ctx);
     std::optional<char> escape;
@@ -24,6 +26,16 @@ void LikeFunction(sqlite3_context* ctx, int argc, sqlite3_value** argv) {
     const std::string_view pattern(p ? p : "", static_cast<size_t>(sqlite3_value_bytes(argv[0])));
     const auto* t = reinterpret_cast<const char*>(sqlite3_value_text(argv[1]));
     const std::string_view text(t ? t : "", static_cast<size_t>(sqlite3_value_bytes(argv[1])));
+    // The pattern is usually the same for every row: SQLite keeps what was learnt about it
+    // (that it is a plain name) for as long as it stays the same. Not with ESCAPE, whose
+    // character could change from row to row.
+    static char plain;
+    bool isPlain = argc == 2 && sqlite3_get_auxdata(ctx, 0) == &plain;
+    if (!isPlain && argc == 2 && JetPlainPattern(pattern)) {
+        sqlite3_set_auxdata(ctx, 0, &plain, nullptr);
+        isPlain = true;
+    }
+    if (isPlain) return sqlite3_result_int(ctx, JetSameText(text, pattern) ? 1 : 0);
     try {
         sqlite3_result_int(ctx, JetLike(text, pattern, escape) ? 1 : 0);
     } catch (const VbError& e) {
@@ -65,9 +77,8 @@ SqliteConnection::SqliteConnection(sqlite3* db, std::filesystem::path file)
     sqlite3_extended_result_codes(db_, 1);
     sqlite3_busy_timeout(db_, BusyTimeoutMs);
     const int flags = SQLITE_UTF8 | SQLITE_DETERMINISTIC | SQLITE_INNOCUOUS;
-    sqlite3_create_function_v2(db_, "like", 2, flags, nullptr, LikeFunction, nullptr, nullptr,
-                               nullptr);
-    sqlite3_create_function_v2(db_, "like", 3, flags, nullptr, LikeFunction, nullptr, nullptr,
+    // One registration for both forms (with and without ESCAPE): every connection pays for it.
+    sqlite3_create_function_v2(db_, "like", -1, flags, nullptr, LikeFunction, nullptr, nullptr,
                                nullptr);
     sqlite3_set_authorizer(db_, Authorize, nullptr);
 }

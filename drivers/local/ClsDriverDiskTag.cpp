@@ -49,8 +49,10 @@ void ClsDriverDiskTag::startup(std::string, std::string TopicName) {
         if (!files().FolderExists(Folder)) files().CreateFolder(Folder);
     });
     // FileExists is false for a path outside the drive root; CreateDISKIODB then refuses it.
+    // A blank file, left by a creation that an older version did not finish, counts as none.
     proc.run([&] {
-        if (!files().FileExists(path_)) CreateDISKIODB();
+        if (!files().FileExists(path_) || Database::Blank(files().resolve(path_)))
+            CreateDISKIODB();
     });
 }
 
@@ -159,19 +161,18 @@ int32_t ClsDriverDiskTag::ReadAllItems() {
 
 void ClsDriverDiskTag::CreateDISKIODB() {
     Procedure proc(kModule, "CreateDISKIODB");
-    std::unique_ptr<Database> db;
     // The original file's locale (general sort order, code page 1252) has no counterpart:
     // text is kept as the bytes given, and like() folds case itself.
-    proc.run([&] { db = Database::Create(files().resolve(path_)); });
+    // The table and its index are made with the file, so a kill leaves no file without them.
     // ID is the engine's auto-increment (its default was "GenUniqueID()"); the text fields
-    // have the engine's default size, which here means no limit.
+    // have the engine's default size, which here means no limit. IDIndex is the primary index
+    // under its own name; ID is the table's key already.
     proc.run([&] {
-        use(db).Execute(
-            "CREATE TABLE TagValues (ID INTEGER PRIMARY KEY AUTOINCREMENT, TagName TEXT, "
-            "TagValue TEXT)");
+        Database::Create(files().resolve(path_),
+                         {"CREATE TABLE TagValues (ID INTEGER PRIMARY KEY AUTOINCREMENT, "
+                          "TagName TEXT, TagValue TEXT)",
+                          "CREATE UNIQUE INDEX IDIndex ON TagValues (ID)"});
     });
-    // The primary index under its own name; ID is the table's key already.
-    proc.run([&] { use(db).Execute("CREATE UNIQUE INDEX IDIndex ON TagValues (ID)"); });
 }
 
 int32_t ClsDriverDiskTag::WriteArray(int32_t, VbArray<Variant>&) {

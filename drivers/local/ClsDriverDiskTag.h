@@ -16,7 +16,8 @@ class Recordset;
 
 // Tags kept on disk, one database file per node: "C:\NUVDiskIO\" + node name + ".mdb", with
 // one table TagValues (ID auto-increment, TagName, TagValue as text, primary index IDIndex).
-// startup creates the folder and the file when they are missing; every other operation opens
+// startup creates the folder and the file when they are missing (a blank file, left by a
+// creation that an older version did not finish, counts as missing); every other operation opens
 // the file afresh, runs "select * from TagValues  where TagName like '<name>'" with the
 // engine's like (wildcards in a name match other rows), and releases the file at its end.
 //
@@ -50,7 +51,8 @@ class ClsDriverDiskTag final : public Driver {
     // Reports the stored text; reports nothing when the row is missing.
     int32_t ReadItem(int32_t ClientHandle) override;
     int32_t ReadAllItems() override;
-    // Creates the database file with its table and index (3204 when it exists).
+    // Creates the database file with its table and index (3204 when it exists). The file
+    // appears only when whole: a process killed meanwhile leaves no file at the path.
     void CreateDISKIODB();
     int32_t WriteArray(int32_t ClientHandle, VbArray<Variant>& data) override;
 

@@ -2,6 +2,7 @@
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
 #include <fstream>
 #include <thread>
 
@@ -38,6 +39,31 @@ TEST_F(DatabaseOpening, OnlyAnExistingDatabaseOpensAndCreateNeverOverwrites) {
     EXPECT_EQ(fresh("select count(*) from TagValues"), Variant(4)) << "existing file touched";
     EXPECT_NE(errorOf([&] { Database::Create(nested); }), 0);
     EXPECT_FALSE(fs::exists(nested.parent_path()));
+}
+
+TEST_F(DatabaseOpening, CreatedFileAppearsWholeAndOnlyABlankFileIsReplaced) {
+    const fs::path made = dir_.path() / "Made.mdb", text = dir_.path() / "Text.mdb";
+    Database::Create(made, {"CREATE TABLE T (A TEXT)", "CREATE INDEX TA ON T (A)"});
+    EXPECT_EQ(Database::Open(made)->OpenRecordset("select count(*) as N from T")->Fields("N"), Variant(0));
+    // A schema that fails leaves neither the file nor the one it was built in.
+    EXPECT_EQ(errorOf([&] { Database::Create(dir_.path() / "Bad.mdb", {"CREATE TABLE T"}); }),
+              err::QuerySyntax);
+    std::vector<std::string> names;
+    for (const auto& entry : fs::directory_iterator(dir_.path()))
+        names.push_back(entry.path().filename());
+    std::sort(names.begin(), names.end());
+    EXPECT_EQ(names, (std::vector<std::string>{"Line1.mdb", "Made.mdb"}));
+
+    std::ofstream(text) << std::string(200, 'x');
+    EXPECT_FALSE(Database::Blank(text)) << "not a database: not ours to replace";
+    EXPECT_FALSE(Database::Blank(made));
+    EXPECT_FALSE(Database::Blank(dir_.path() / "Gone.mdb"));
+    fs::resize_file(made, 0);
+    EXPECT_TRUE(Database::Blank(made));
+    Database::Create(made);  // the header only, as a creation cut short left it
+    EXPECT_TRUE(Database::Blank(made));
+    Database::Create(made, {"CREATE TABLE T (A TEXT)"});
+    EXPECT_EQ(errorOf([&] { Database::Create(made); }), err::DatabaseExists);
 }
 
 class DatabaseQueries : public ProjectDatabase {

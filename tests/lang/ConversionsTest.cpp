@@ -74,6 +74,14 @@ TEST(NumberConversion, SingleDoubleAndBoolean) {
     };
     expectConversions(CDbl, doubles);
     EXPECT_GT(*ParseNumber("1e-310"), 0.0);  // subnormal, still a number
+    // Whole numbers take a shorter way than the rest; both must give the same Doubles.
+    EXPECT_EQ(*ParseNumber(" 007 "), 7.0);
+    EXPECT_TRUE(std::signbit(*ParseNumber("-0")));
+    EXPECT_EQ(*ParseNumber("+999999999999999"), 999999999999999.0);
+    EXPECT_EQ(*ParseNumber("9007199254740993"), 9007199254740992.0);  // rounded to even
+    EXPECT_EQ(*ParseNumber("-12345678901234567890"), -12345678901234567890.0);
+    EXPECT_FALSE(ParseNumber("-"));
+    EXPECT_FALSE(ParseNumber("12 3"));
     const Row booleans[] = {
         {int16_t{2}, 1}, {-0.5, 1}, {0.0, 0},   {Variant(), 0},   {"tRUE", 1},
         {"false", 0},    {"2", 1},  {"0.0", 0}, {"Truex", 0, 13}, {kNull, 0, 94},
