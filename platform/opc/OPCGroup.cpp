@@ -57,6 +57,7 @@ void OPCGroup::requireLive(const char* what) const {
 }
 
 void OPCGroup::rearm() {
+    if (connection_) items_.scan(OpcScan{active_, updateRate_, name_});
     const bool on = connection_ && active_ && subscribed_;
     if (on) timer_.Interval(updateRate_);
     timer_.Enabled(on);
