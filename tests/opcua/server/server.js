@@ -1,11 +1,12 @@
 // An OPC UA server for the client's end-to-end tests and benchmark, on node-opcua: an
 // implementation that owes nothing to ours. It listens on 127.0.0.1 (port from argv[2], 0 for
-// a free one), prints "ENDPOINT opc.tcp://127.0.0.1:PORT" once it listens, and takes commands
+// a free one; argv[3] the secure channel lifetime in ms), prints "ENDPOINT opc.tcp://127.0.0.1:PORT" once it listens, and takes commands
 // on standard input, one a line, answering each with "OK <command>":
 //   stop          stops listening (sessions and connections go)
 //   start         listens again on the same port
-//   silent        keeps the connections but answers nothing any more (until "start")
-//   lifetime MS   revises secure channel lifetimes to MS from now on
+//   silent MS     answers nothing for MS ms: connections stay open and new ones are
+//                 accepted by the system, but nothing is read or sent
+//   lifetime MS   revises the lifetime of secure channels opened from now on to MS
 //   set NAME V    sets a variable (JSON value)
 //   bench N MS    N extra Double variables "ns=1;s=Bench.K", each changing every MS ms
 //   quit          exits
@@ -16,8 +17,7 @@ const requestedPort = Number(process.argv[2] || 0);
 const ns = "urn:maroset:test";
 let server = null;
 let port = requestedPort;
-let silent = false;
-let lifetimeOverride = 0;
+let lifetime = Number(process.argv[3] || 0);
 const values = {};
 const ticking = [];
 let setValue = null;
@@ -99,6 +99,7 @@ async function start() {
         maxConnections: 50,
         serverCapabilities: { maxSessions: 50 },
         buildInfo: { productName: "maroset-test-server" },
+        defaultSecureTokenLifetime: lifetime || undefined,
     });
     await server.initialize();
     const namespace = server.engine.addressSpace.registerNamespace(ns);
@@ -118,16 +119,9 @@ async function stop() {
     ticking.length = 0;
 }
 
-// "silent": every transport stops reading; the sockets stay open.
-function setSilent(on) {
-    silent = on;
-    if (!server) return;
-    for (const ep of server.endpoints) {
-        for (const channel of Object.values(ep._channels || {})) {
-            const socket = channel.transport && channel.transport._socket;
-            if (socket) on ? socket.pause() : socket.resume();
-        }
-    }
+// The whole process stops for a while, without using the processor.
+function freeze(ms) {
+    Atomics.wait(new Int32Array(new SharedArrayBuffer(4)), 0, 0, ms);
 }
 
 const commands = readline.createInterface({ input: process.stdin });
@@ -135,11 +129,11 @@ commands.on("line", async (line) => {
     const [cmd, ...args] = line.trim().split(/\s+/);
     try {
         if (cmd === "stop") await stop();
-        else if (cmd === "start") { if (silent) setSilent(false); else if (!server) await start(); }
-        else if (cmd === "silent") setSilent(true);
+        else if (cmd === "start") { if (!server) await start(); }
+        else if (cmd === "silent") setTimeout(() => freeze(Number(args[0])), 50);
         else if (cmd === "lifetime") {
-            lifetimeOverride = Number(args[0]);
-            for (const ep of server.endpoints) ep.defaultSecureTokenLifetime = lifetimeOverride;
+            lifetime = Number(args[0]);
+            for (const ep of server.endpoints) ep.defaultSecureTokenLifetime = lifetime;
         } else if (cmd === "set") setValue(args[0], JSON.parse(args.slice(1).join(" ")));
         else if (cmd === "bench") bench(Number(args[0]), Number(args[1]));
         else if (cmd === "quit") { await stop(); process.exit(0); }
