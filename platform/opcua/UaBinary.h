@@ -61,6 +61,12 @@ struct NodeId {
     std::array<uint8_t, 16> guid{};  // as encoded: Data1..3 little-endian, then Data4
     std::string namespaceUri;
 
+    static NodeId Numeric(uint32_t id, uint16_t ns = 0) {
+        NodeId n;
+        n.ns = ns;
+        n.numeric = id;
+        return n;
+    }
     friend bool operator==(const NodeId&, const NodeId&) = default;
 };
 

@@ -20,11 +20,6 @@ constexpr uint32_t ApplicationTypeClient = 1;
 constexpr uint32_t UserTokenAnonymous = 0;
 constexpr uint32_t BadConnectionClosed = 0x80AE0000;
 
-// Where the values after a response header start: its string table has a length.
-size_t afterHeader(const std::vector<Value>& v) {
-    return v.size() > 4 ? 6 + v[4].count : v.size();
-}
-
 uint32_t serviceResult(const std::vector<Value>& v) {
     return v.size() > 2 ? static_cast<uint32_t>(v[2].number) : status::BadCommunicationError;
 }
@@ -37,15 +32,6 @@ bool sessionLost(uint32_t s) {
            k == status::BadSecureChannelClosed || k == 0x80870000 /* token unknown */;
 }
 
-Value& add(std::vector<Value>& v) { return v.emplace_back(); }
-void addNumber(std::vector<Value>& v, uint64_t n) { add(v).number = n; }
-void addText(std::vector<Value>& v, std::string_view t) { add(v).text = t; }
-void addNull(std::vector<Value>& v) { add(v).null = true; }
-void addLength(std::vector<Value>& v, uint32_t n) {
-    Value& l = add(v);
-    l.isLength = true;
-    l.count = n;
-}
 
 }  // namespace
 
@@ -125,7 +111,7 @@ void UaClient::stop() {
     retryTimer_.reset();
     if (state_ == State::Active && stream_) {
         // Said politely; the server forgets the session when the channel goes anyway.
-        send(msg::CloseSessionRequest, [](std::vector<Value>& v) { addNumber(v, 1); },
+        send(msg::CloseSessionRequest, [](std::vector<Value>& v) { AddNumber(v, 1); },
              nextHandle_++, 0);
     }
     closeStream();
@@ -333,14 +319,14 @@ void UaClient::openChannel(bool renew) {
     if (!renew) enter(State::Channel);
     std::vector<Value> v;
     AppendRequestHeader(v, NodeId{}, ticksNow(), nextHandle_++, 0);
-    addNumber(v, 0);  // protocol version
-    addNumber(v, renew ? 1 : 0);
-    addNumber(v, MessageSecurityModeNone);
-    addNull(v);  // client nonce
-    addNumber(v, static_cast<uint64_t>(options_.channelLifetime.count()));
+    AddNumber(v, 0);  // protocol version
+    AddNumber(v, renew ? 1 : 0);
+    AddNumber(v, MessageSecurityModeNone);
+    AddNull(v);  // client nonce
+    AddNumber(v, static_cast<uint64_t>(options_.channelLifetime.count()));
     body_.clear();
     Writer w(body_);
-    w.nodeId(NodeId{0, NodeId::Kind::Numeric, msg::OpenSecureChannelRequest.encodingId});
+    w.nodeId(NodeId::Numeric(msg::OpenSecureChannelRequest.encodingId));
     Encode(w, msg::OpenSecureChannelRequest, v);
     out_.clear();
     WriteChunks(out_, "OPN", channelId_, 0, sequence_, nextRequestId_++, body_, sendChunkSize_);
@@ -364,7 +350,7 @@ void UaClient::onChannel(const UaMessage& m) {
         fail("the server refused the secure channel", s);
         return;
     }
-    const size_t i = afterHeader(v);
+    const size_t i = AfterHeader(v);
     if (v.size() < i + 6) throw DecodeError("short OpenSecureChannelResponse");
     channelId_ = static_cast<uint32_t>(v[i + 1].number);
     tokenId_ = static_cast<uint32_t>(v[i + 2].number);
@@ -390,7 +376,7 @@ void UaClient::send(const StructType& request, const Fill& fill, uint32_t handle
     fill(v);
     std::string body;
     Writer w(body);
-    w.nodeId(NodeId{0, NodeId::Kind::Numeric, request.encodingId});
+    w.nodeId(NodeId::Numeric(request.encodingId));
     Encode(w, request, v);
     out_.clear();
     WriteChunks(out_, "MSG", channelId_, tokenId_, sequence_, handle, body, sendChunkSize_);
@@ -410,7 +396,7 @@ void UaClient::createSession() {
                 fail("the server refused the session", s ? s : status::BadTimeout);
                 return;
             }
-            const size_t i = afterHeader(v);
+            const size_t i = AfterHeader(v);
             authenticationToken_ = v.at(i + 1).node;
             // The endpoints: is there one with security None, and its anonymous policy?
             size_t at = i + 5;
@@ -455,20 +441,20 @@ void UaClient::createSession() {
     const std::string& url = options_.endpointUrl;
     send(msg::CreateSessionRequest,
          [&url](std::vector<Value>& v) {
-             addText(v, "urn:maroset:opcua-client");
-             addText(v, "urn:maroset");
-             addText(v, "Maroset");
-             addNumber(v, ApplicationTypeClient);
-             addNull(v);
-             addNull(v);
-             addLength(v, 0);
-             addNull(v);  // serverUri
-             addText(v, url);
-             addText(v, "Maroset");
-             addNull(v);  // nonce: nothing is signed
-             addNull(v);  // certificate
-             add(v).real = SessionTimeoutMs;
-             addNumber(v, MaxMessageSize);
+             AddText(v, "urn:maroset:opcua-client");
+             AddText(v, "urn:maroset");
+             AddText(v, "Maroset");
+             AddNumber(v, ApplicationTypeClient);
+             AddNull(v);
+             AddNull(v);
+             AddLength(v, 0);
+             AddNull(v);  // serverUri
+             AddText(v, url);
+             AddText(v, "Maroset");
+             AddNull(v);  // nonce: nothing is signed
+             AddNull(v);  // certificate
+             AddValue(v).real = SessionTimeoutMs;
+             AddNumber(v, MaxMessageSize);
          },
          handle, timeout);
 }
@@ -500,16 +486,16 @@ void UaClient::activateSession(const std::string& policyId) {
         false};
     send(msg::ActivateSessionRequest,
          [&token](std::vector<Value>& v) {
-             addNull(v);
-             addNull(v);  // client signature
-             addLength(v, 0);
-             addLength(v, 0);
-             Value& t = add(v);
-             t.node = NodeId{0, NodeId::Kind::Numeric, msg::AnonymousIdentityToken.encodingId};
+             AddNull(v);
+             AddNull(v);  // client signature
+             AddLength(v, 0);
+             AddLength(v, 0);
+             Value& t = AddValue(v);
+             t.node = NodeId::Numeric(msg::AnonymousIdentityToken.encodingId);
              t.number = 1;
              t.text = *token;
-             addNull(v);
-             addNull(v);  // token signature
+             AddNull(v);
+             AddNull(v);  // token signature
          },
          handle, static_cast<uint32_t>(options_.callTimeout.count()));
 }
@@ -522,7 +508,7 @@ void UaClient::readNamespaces() {
         [this, alive](uint32_t s, std::vector<Value>& v) {
             if (state_ != State::Session) return;
             namespaces_.clear();
-            const size_t i = afterHeader(v);
+            const size_t i = AfterHeader(v);
             if (!IsBad(s) && v.size() > i + 1 && v[i].count == 1 &&
                 v[i + 1].data.value.isArray()) {
                 for (const Variant& e : v[i + 1].data.value.array())
@@ -545,13 +531,13 @@ void UaClient::readNamespaces() {
         false};
     send(msg::ReadRequest,
          [](std::vector<Value>& v) {
-             add(v).real = 0;
-             addNumber(v, 3);  // no time stamps
-             addLength(v, 1);
-             add(v).node = NodeId{0, NodeId::Kind::Numeric, NamespaceArray};
-             addNumber(v, 13);
-             addNull(v);
-             addNull(v);
+             AddValue(v).real = 0;
+             AddNumber(v, 3);  // no time stamps
+             AddLength(v, 1);
+             AddValue(v).node = NodeId::Numeric(NamespaceArray);
+             AddNumber(v, 13);
+             AddNull(v);
+             AddNull(v);
          },
          handle, static_cast<uint32_t>(options_.callTimeout.count()));
 }
@@ -630,10 +616,10 @@ void UaClient::topUpPublish() {
         acks_.clear();
         send(msg::PublishRequest,
              [&acks](std::vector<Value>& v) {
-                 addLength(v, static_cast<uint32_t>(acks.size()));
+                 AddLength(v, static_cast<uint32_t>(acks.size()));
                  for (const auto& [sub, seq] : acks) {
-                     addNumber(v, sub);
-                     addNumber(v, seq);
+                     AddNumber(v, sub);
+                     AddNumber(v, seq);
                  }
              },
              handle, static_cast<uint32_t>((options_.silence * 4).count()));
@@ -659,7 +645,7 @@ void UaClient::onPublish(uint32_t s, std::vector<Value>& v) {
         topUpPublish();
         return;
     }
-    const size_t i = afterHeader(v);
+    const size_t i = AfterHeader(v);
     if (v.size() < i + 2) return;
     const auto subscription = static_cast<uint32_t>(v[i].number);
     size_t at = i + 2 + v[i + 1].count;  // past availableSequenceNumbers

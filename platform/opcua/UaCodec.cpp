@@ -45,7 +45,7 @@ size_t minSize(const Field& f) {
 // ---- decoding ----
 
 template <class T>
-Variant arrayOf(Reader& r, uint32_t n, T&& element) {
+Variant arrayOf(uint32_t n, T&& element) {
     std::vector<Variant> items;
     items.reserve(n);
     for (uint32_t i = 0; i < n; ++i) items.push_back(element());
@@ -372,7 +372,7 @@ void DecodeVariant(Reader& r, DataValue& out) {
     const uint32_t n = r.arrayLength(minSize(Field{t}));
     if (t == BuiltIn::Variant || t == BuiltIn::DataValue) {
         // An array of Variants: each element is decoded, none nested deeper.
-        out.value = arrayOf(r, n, [&r] {
+        out.value = arrayOf(n, [&r] {
             const uint8_t m = r.u8();
             const uint8_t eid = m & 0x3F;
             if ((m & 0xC0) || eid > LastBuiltIn || eid == 0 ||
@@ -382,7 +382,7 @@ void DecodeVariant(Reader& r, DataValue& out) {
             return scalar(r, static_cast<BuiltIn>(eid));
         });
     } else {
-        out.value = arrayOf(r, n, [&r, t] { return scalar(r, t); });
+        out.value = arrayOf(n, [&r, t] { return scalar(r, t); });
     }
     if (mask & 0x40) {
         // Dimensions of a matrix: the elements were read in order, which is all the host gets.

@@ -60,6 +60,17 @@ struct Value {
     DataValue data;             // Variant and DataValue
 };
 
+// Appending a request's values in walk order.
+inline Value& AddValue(std::vector<Value>& v) { return v.emplace_back(); }
+inline void AddNumber(std::vector<Value>& v, uint64_t n) { v.emplace_back().number = n; }
+inline void AddText(std::vector<Value>& v, std::string_view t) { v.emplace_back().text = t; }
+inline void AddNull(std::vector<Value>& v) { v.emplace_back().null = true; }
+inline void AddLength(std::vector<Value>& v, uint32_t n) {
+    Value& l = v.emplace_back();
+    l.isLength = true;
+    l.count = n;
+}
+
 // Encodes `type` from values given in walk order; fails (std::logic_error) when the values
 // do not follow the description, which is a fault of the caller.
 void Encode(Writer& w, const StructType& type, std::span<const Value> values);

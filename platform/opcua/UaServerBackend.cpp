@@ -57,16 +57,6 @@ int32_t resultOf(uint32_t status) {
     }
 }
 
-Value& add(std::vector<Value>& v) { return v.emplace_back(); }
-void addNumber(std::vector<Value>& v, uint64_t n) { add(v).number = n; }
-void addLength(std::vector<Value>& v, uint32_t n) {
-    Value& l = add(v);
-    l.isLength = true;
-    l.count = n;
-}
-size_t afterHeader(const std::vector<Value>& v) {
-    return v.size() > 4 ? 6 + v[4].count : v.size();
-}
 
 }  // namespace
 
@@ -129,17 +119,17 @@ int32_t UaItem::Write(const Variant& value) {
     b.client_->call(
         msg::WriteRequest, msg::WriteResponse,
         [&](std::vector<Value>& v) {
-            addLength(v, 1);
-            add(v).node = node;
-            addNumber(v, attr::Value);
-            add(v).null = true;
-            Value& d = add(v);
+            AddLength(v, 1);
+            AddValue(v).node = node;
+            AddNumber(v, attr::Value);
+            AddValue(v).null = true;
+            Value& d = AddValue(v);
             d.data.value = converted;
             d.data.type = type;
         },
         [&done, &result, alive = std::weak_ptr<bool>(b.alive_), &b](uint32_t s,
                                                                      std::vector<Value>& v) {
-            const size_t i = afterHeader(v);
+            const size_t i = AfterHeader(v);
             result = IsBad(s) || v.size() < i + 2 ? (s ? s : status::BadCommunicationError)
                                                   : static_cast<uint32_t>(v[i + 1].number);
             done = true;
@@ -357,21 +347,21 @@ void UaServerBackend::resolveAll() {
     client_->call(
         msg::ReadRequest, msg::ReadResponse,
         [&nodes](std::vector<Value>& v) {
-            add(v).real = 0;
-            addNumber(v, 0);  // source time stamps
-            addLength(v, static_cast<uint32_t>(nodes.size() * 2));
+            AddValue(v).real = 0;
+            AddNumber(v, 0);  // source time stamps
+            AddLength(v, static_cast<uint32_t>(nodes.size() * 2));
             for (const NodeId& node : nodes) {
                 for (uint32_t attribute : {attr::UserAccessLevel, attr::Value}) {
-                    add(v).node = node;
-                    addNumber(v, attribute);
-                    add(v).null = true;
-                    add(v).null = true;
+                    AddValue(v).node = node;
+                    AddNumber(v, attribute);
+                    AddValue(v).null = true;
+                    AddValue(v).null = true;
                 }
             }
         },
         [this, alive, handles](uint32_t s, std::vector<Value>& v) {
             if (alive.expired()) return;
-            const size_t i = afterHeader(v);
+            const size_t i = AfterHeader(v);
             const bool ok = !IsBad(s) && v.size() > i && v[i].count == handles.size() * 2;
             const DateTime now = clock_.now();
             for (size_t k = 0; k < handles.size(); ++k) {
@@ -448,9 +438,9 @@ void UaServerBackend::sync() {
         client_->call(
             msg::DeleteMonitoredItemsRequest, msg::StatusResultsResponse,
             [sub, &ids](std::vector<Value>& v) {
-                addNumber(v, sub);
-                addLength(v, static_cast<uint32_t>(ids.size()));
-                for (uint32_t id : ids) addNumber(v, id);
+                AddNumber(v, sub);
+                AddLength(v, static_cast<uint32_t>(ids.size()));
+                for (uint32_t id : ids) AddNumber(v, id);
             },
             [next](uint32_t, std::vector<Value>&) { next(); });
         return;
@@ -469,25 +459,26 @@ void UaServerBackend::sync() {
         // Keep-alives about every 2 s, so a silent server is noticed in time.
         const auto keepAlive = static_cast<uint32_t>(std::max(1, 2000 / std::max(rate, 1)));
         const bool publishing = active;
+        const int32_t r = rate;
         client_->call(
             msg::CreateSubscriptionRequest, msg::CreateSubscriptionResponse,
             [=](std::vector<Value>& v) {
-                add(v).real = interval;
-                addNumber(v, keepAlive * 3);
-                addNumber(v, keepAlive);
-                addNumber(v, 0);
-                addNumber(v, publishing ? 1 : 0);
-                addNumber(v, 0);
+                AddValue(v).real = interval;
+                AddNumber(v, keepAlive * 3);
+                AddNumber(v, keepAlive);
+                AddNumber(v, 0);
+                AddNumber(v, publishing ? 1 : 0);
+                AddNumber(v, 0);
             },
-            [this, alive, rate, publishing, next](uint32_t s, std::vector<Value>& v) {
+            [this, alive, r, publishing, next](uint32_t s, std::vector<Value>& v) {
                 if (alive.expired()) return;
-                const size_t i = afterHeader(v);
+                const size_t i = AfterHeader(v);
                 if (IsBad(s) || v.size() <= i) {
                     trace("subscription refused", s);
                     syncing_ = false;
                     return;
                 }
-                subscriptions_[rate] = Subscription{static_cast<uint32_t>(v[i].number), publishing};
+                subscriptions_[r] = Subscription{static_cast<uint32_t>(v[i].number), publishing};
                 client_->publishing(true);
                 next();
             });
@@ -516,25 +507,25 @@ void UaServerBackend::sync() {
         client_->call(
             msg::CreateMonitoredItemsRequest, msg::CreateMonitoredItemsResponse,
             [&](std::vector<Value>& v) {
-                addNumber(v, subId);
-                addNumber(v, 0);
-                addLength(v, static_cast<uint32_t>(batch.size()));
+                AddNumber(v, subId);
+                AddNumber(v, 0);
+                AddLength(v, static_cast<uint32_t>(batch.size()));
                 for (UaItem* item : batch) {
-                    add(v).node = item->resolved_node_;
-                    addNumber(v, attr::Value);
-                    add(v).null = true;
-                    add(v).null = true;
-                    addNumber(v, item->scan_.active ? MonitoringReporting : MonitoringDisabled);
-                    addNumber(v, item->handle_);
-                    add(v).real = r;
-                    add(v);  // no filter
-                    addNumber(v, 1);
-                    addNumber(v, 1);
+                    AddValue(v).node = item->resolved_node_;
+                    AddNumber(v, attr::Value);
+                    AddValue(v).null = true;
+                    AddValue(v).null = true;
+                    AddNumber(v, item->scan_.active ? MonitoringReporting : MonitoringDisabled);
+                    AddNumber(v, item->handle_);
+                    AddValue(v).real = r;
+                    AddValue(v);  // no filter
+                    AddNumber(v, 1);
+                    AddNumber(v, 1);
                 }
             },
             [this, alive, handles, modes, subId, r, next](uint32_t s, std::vector<Value>& v) {
                 if (alive.expired()) return;
-                const size_t i = afterHeader(v);
+                const size_t i = AfterHeader(v);
                 const bool ok = !IsBad(s) && v.size() > i && v[i].count == handles.size();
                 for (size_t k = 0; k < handles.size(); ++k) {
                     const auto it = items_.find(handles[k]);
@@ -577,10 +568,10 @@ void UaServerBackend::sync() {
             client_->call(
                 msg::SetMonitoringModeRequest, msg::StatusResultsResponse,
                 [&](std::vector<Value>& v) {
-                    addNumber(v, subId);
-                    addNumber(v, active ? MonitoringReporting : MonitoringDisabled);
-                    addLength(v, static_cast<uint32_t>(ids.size()));
-                    for (uint32_t id : ids) addNumber(v, id);
+                    AddNumber(v, subId);
+                    AddNumber(v, active ? MonitoringReporting : MonitoringDisabled);
+                    AddLength(v, static_cast<uint32_t>(ids.size()));
+                    for (uint32_t id : ids) AddNumber(v, id);
                 },
                 [next](uint32_t, std::vector<Value>&) { next(); });
             return;
@@ -598,8 +589,8 @@ void UaServerBackend::sync() {
             client_->call(
                 msg::DeleteSubscriptionsRequest, msg::StatusResultsResponse,
                 [subId](std::vector<Value>& v) {
-                    addLength(v, 1);
-                    addNumber(v, subId);
+                    AddLength(v, 1);
+                    AddNumber(v, subId);
                 },
                 [next](uint32_t, std::vector<Value>&) { next(); });
             return;
@@ -611,9 +602,9 @@ void UaServerBackend::sync() {
         client_->call(
             msg::SetPublishingModeRequest, msg::StatusResultsResponse,
             [subId, on](std::vector<Value>& v) {
-                addNumber(v, on ? 1 : 0);
-                addLength(v, 1);
-                addNumber(v, subId);
+                AddNumber(v, on ? 1 : 0);
+                AddLength(v, 1);
+                AddNumber(v, subId);
             },
             [next](uint32_t, std::vector<Value>&) { next(); });
         return;

@@ -100,6 +100,12 @@ constexpr uint32_t BadServerNotConnected = 0x800D0000;
 std::string StatusName(uint32_t code);
 inline bool IsBad(uint32_t code) { return (code & 0x80000000u) != 0; }
 
+// Where a response's own values start, after its header's (whose string table has a
+// length of its own).
+inline size_t AfterHeader(const std::vector<Value>& v) {
+    return v.size() > 4 ? 6 + v[4].count : v.size();
+}
+
 // A request header's values: the session's token, the time, the request handle, the
 // time-out hint.
 void AppendRequestHeader(std::vector<Value>& values, const NodeId& token, int64_t ticks,

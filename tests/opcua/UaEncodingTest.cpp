@@ -222,7 +222,7 @@ TEST(UaStructures, AReadRequestEncodesAsItsDescriptionSays) {
     Value& len = v.emplace_back();
     len.isLength = true;
     len.count = 1;
-    v.emplace_back().node = NodeId{0, NodeId::Kind::Numeric, 2255};
+    v.emplace_back().node = NodeId::Numeric(2255);
     v.emplace_back().number = 13;
     v.emplace_back().null = true;
     v.emplace_back().null = true;

@@ -128,6 +128,7 @@ const commands = readline.createInterface({ input: process.stdin });
 commands.on("line", async (line) => {
     const [cmd, ...args] = line.trim().split(/\s+/);
     try {
+        await ready;
         if (cmd === "stop") await stop();
         else if (cmd === "start") { if (!server) await start(); }
         else if (cmd === "silent") setTimeout(() => freeze(Number(args[0])), 50);
@@ -144,4 +145,4 @@ commands.on("line", async (line) => {
 });
 commands.on("close", async () => { await stop(); process.exit(0); });
 
-start().catch((e) => { console.error(e); process.exit(1); });
+const ready = start().catch((e) => { console.error(e); process.exit(1); });
