@@ -385,11 +385,8 @@ void UaClient::send(const StructType& request, const Fill& fill, uint32_t handle
 
 void UaClient::createSession() {
     enter(State::Session);
-    const auto handle = nextHandle_++;
     const std::weak_ptr<bool> alive = alive_;
-    const uint32_t timeout = static_cast<uint32_t>(options_.callTimeout.count());
-    pending_[handle] = Pending{
-        &msg::CreateSessionResponse, msg::CreateSessionRequest.encodingId + ResponseOffset,
+    Done done = (
         [this](uint32_t s, std::vector<Value>& v) {
             if (state_ != State::Session) return;
             if (IsBad(s) || v.empty()) {
@@ -430,16 +427,9 @@ void UaClient::createSession() {
                 return;
             }
             activateSession(*anonymous);
-        },
-        loop_.schedule(options_.callTimeout,
-                       [this, alive, handle] {
-                           if (alive.expired()) return;
-                           std::vector<Value> none;
-                           respond(handle, status::BadTimeout, none);
-                       }),
-        false};
+        });
     const std::string& url = options_.endpointUrl;
-    send(msg::CreateSessionRequest,
+    request(msg::CreateSessionRequest, msg::CreateSessionResponse,
          [&url](std::vector<Value>& v) {
              AddText(v, "urn:maroset:opcua-client");
              AddText(v, "urn:maroset");
@@ -456,7 +446,7 @@ void UaClient::createSession() {
              AddValue(v).real = SessionTimeoutMs;
              AddNumber(v, MaxMessageSize);
          },
-         handle, timeout);
+         std::move(done));
 }
 
 void UaClient::activateSession(const std::string& policyId) {
@@ -465,10 +455,8 @@ void UaClient::activateSession(const std::string& policyId) {
         Writer w(*token);
         w.bytes(policyId);
     }
-    const auto handle = nextHandle_++;
     const std::weak_ptr<bool> alive = alive_;
-    pending_[handle] = Pending{
-        &msg::ActivateSessionResponse, msg::ActivateSessionRequest.encodingId + ResponseOffset,
+    Done done = (
         [this](uint32_t s, std::vector<Value>& v) {
             if (state_ != State::Session) return;
             if (IsBad(s) || v.empty()) {
@@ -476,15 +464,8 @@ void UaClient::activateSession(const std::string& policyId) {
                 return;
             }
             readNamespaces();
-        },
-        loop_.schedule(options_.callTimeout,
-                       [this, alive, handle] {
-                           if (alive.expired()) return;
-                           std::vector<Value> none;
-                           respond(handle, status::BadTimeout, none);
-                       }),
-        false};
-    send(msg::ActivateSessionRequest,
+        });
+    request(msg::ActivateSessionRequest, msg::ActivateSessionResponse,
          [&token](std::vector<Value>& v) {
              AddNull(v);
              AddNull(v);  // client signature
@@ -497,14 +478,12 @@ void UaClient::activateSession(const std::string& policyId) {
              AddNull(v);
              AddNull(v);  // token signature
          },
-         handle, static_cast<uint32_t>(options_.callTimeout.count()));
+         std::move(done));
 }
 
 void UaClient::readNamespaces() {
-    const auto handle = nextHandle_++;
     const std::weak_ptr<bool> alive = alive_;
-    pending_[handle] = Pending{
-        &msg::ReadResponse, msg::ReadRequest.encodingId + ResponseOffset,
+    Done done = (
         [this, alive](uint32_t s, std::vector<Value>& v) {
             if (state_ != State::Session) return;
             namespaces_.clear();
@@ -521,15 +500,8 @@ void UaClient::readNamespaces() {
             enter(State::Active);
             if (alive.expired()) return;
             topUpPublish();
-        },
-        loop_.schedule(options_.callTimeout,
-                       [this, alive, handle] {
-                           if (alive.expired()) return;
-                           std::vector<Value> none;
-                           respond(handle, status::BadTimeout, none);
-                       }),
-        false};
-    send(msg::ReadRequest,
+        });
+    request(msg::ReadRequest, msg::ReadResponse,
          [](std::vector<Value>& v) {
              AddValue(v).real = 0;
              AddNumber(v, 3);  // no time stamps
@@ -539,7 +511,7 @@ void UaClient::readNamespaces() {
              AddNull(v);
              AddNull(v);
          },
-         handle, static_cast<uint32_t>(options_.callTimeout.count()));
+         std::move(done));
 }
 
 void UaClient::respond(uint32_t handle, uint32_t status, std::vector<Value>& values) {
@@ -565,7 +537,7 @@ void UaClient::respond(uint32_t handle, uint32_t status, std::vector<Value>& val
              status::BadTimeout);
 }
 
-void UaClient::call(const StructType& request, const StructType& response, const Fill& fill,
+void UaClient::call(const StructType& type, const StructType& response, const Fill& fill,
                     Done done) {
     if (state_ != State::Active) {
         const std::weak_ptr<bool> alive = alive_;
@@ -576,9 +548,15 @@ void UaClient::call(const StructType& request, const StructType& response, const
         });
         return;
     }
+    request(type, response, fill, std::move(done));
+    armSilence();
+}
+
+void UaClient::request(const StructType& type, const StructType& response, const Fill& fill,
+                       Done done) {
     const auto handle = nextHandle_++;
     const std::weak_ptr<bool> alive = alive_;
-    pending_[handle] = Pending{&response, request.encodingId + ResponseOffset, std::move(done),
+    pending_[handle] = Pending{&response, type.encodingId + ResponseOffset, std::move(done),
                                loop_.schedule(options_.callTimeout,
                                               [this, alive, handle] {
                                                   if (alive.expired()) return;
@@ -586,8 +564,7 @@ void UaClient::call(const StructType& request, const StructType& response, const
                                                   respond(handle, status::BadTimeout, none);
                                               }),
                                false};
-    send(request, fill, handle, static_cast<uint32_t>(options_.callTimeout.count()));
-    armSilence();
+    send(type, fill, handle, static_cast<uint32_t>(options_.callTimeout.count()));
 }
 
 void UaClient::publishing(bool on) {

@@ -120,6 +120,8 @@ class UaClient {
     void activateSession(const std::string& policyId);
     void readNamespaces();
     void send(const StructType& request, const Fill& fill, uint32_t handle, uint32_t timeoutMs);
+    // Sends a request in any state and waits callTimeout for its answer.
+    void request(const StructType& type, const StructType& response, const Fill& fill, Done done);
     void respond(uint32_t handle, uint32_t status, std::vector<Value>& values);
     void failAll(uint32_t status);
     void topUpPublish();
