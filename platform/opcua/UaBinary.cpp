@@ -316,6 +316,9 @@ void Writer::nodeId(const NodeId& id) {
 
 double DateFromTicks(int64_t ticks) {
     if (ticks == 0) return 0.0;
+    // Whatever a server sends: the difference is taken where it cannot overflow.
+    if (ticks < INT64_MIN + TicksAtDateZero)
+        return (static_cast<double>(ticks) - static_cast<double>(TicksAtDateZero)) / TicksPerDay;
     return static_cast<double>(ticks - TicksAtDateZero) / TicksPerDay;
 }
 

@@ -23,15 +23,14 @@ void UaChunkAssembler::reset() {
 
 void UaChunkAssembler::feed(std::string_view bytes,
                             const std::function<void(const UaMessage&)>& deliver) {
-    // Whole chunks straight from the arrival; only a tail that is not complete is kept. A
-    // handler may reset the assembler (the connection is given up): the rest is dropped.
-    std::string joined;
-    if (!pending_.empty()) {
-        joined = std::move(pending_);
-        pending_.clear();
-        joined.append(bytes);
-        bytes = joined;
+    // Whole chunks straight from the arrival; only a tail that is not complete is kept, and
+    // a chunk trickling in is appended to, never copied again, however it is split.
+    const bool buffered = !pending_.empty();
+    if (buffered) {
+        pending_.append(bytes);
+        bytes = pending_;
     }
+    // A handler may reset the assembler (the connection is given up): the rest is dropped.
     const uint64_t generation = generation_;
     size_t at = 0;
     while (bytes.size() - at >= HeaderSize) {
@@ -44,7 +43,11 @@ void UaChunkAssembler::feed(std::string_view bytes,
         if (generation != generation_) return;
         at += size;
     }
-    pending_.assign(bytes.substr(at));
+    if (buffered) {
+        pending_.erase(0, at);
+    } else {
+        pending_.assign(bytes.substr(at));
+    }
 }
 
 void UaChunkAssembler::chunk(std::string_view c,
