@@ -262,6 +262,53 @@ int32_t UaServerBackend::AddItem(const std::string& itemID,
     return opc::S_OK;
 }
 
+bool UaServerBackend::Refresh(const std::vector<std::shared_ptr<OpcItemSource>>& items,
+                              std::function<void()> done) {
+    if (client_->state() != UaClient::State::Active) return false;
+    std::vector<uint32_t> handles;
+    std::vector<NodeId> nodes;
+    for (const auto& source : items) {
+        const auto* item = dynamic_cast<const UaItem*>(source.get());
+        if (!item || !item->resolved_) continue;
+        handles.push_back(item->handle_);
+        nodes.push_back(item->resolved_node_);
+    }
+    if (nodes.empty()) return false;
+    const std::weak_ptr<bool> alive = alive_;
+    client_->call(
+        msg::ReadRequest, msg::ReadResponse,
+        [&nodes](std::vector<Value>& v) {
+            AddValue(v).real = 0;  // the device's value, not a cached one
+            AddNumber(v, 0);
+            AddLength(v, static_cast<uint32_t>(nodes.size()));
+            for (const NodeId& node : nodes) {
+                AddValue(v).node = node;
+                AddNumber(v, attr::Value);
+                AddNull(v);
+                AddNull(v);
+            }
+        },
+        [this, alive, handles, done = std::move(done)](uint32_t s, std::vector<Value>& v) {
+            if (!alive.expired()) {
+                const size_t i = AfterHeader(v);
+                const bool ok = !IsBad(s) && v.size() > i && v[i].count == handles.size();
+                const DateTime now = clock_.now();
+                for (size_t k = 0; ok && k < handles.size(); ++k) {
+                    const auto it = items_.find(handles[k]);
+                    if (it == items_.end()) continue;
+                    DataValue& value = v[i + 1 + k].data;
+                    OpcItemState& state = it->second->state_;
+                    state.value = std::move(value.value);
+                    state.quality = qualityOf(value.status);
+                    state.timeStamp = now;
+                }
+                if (!ok) trace("read refused", s);
+            }
+            done();
+        });
+    return true;
+}
+
 void UaServerBackend::detach(UaItem& item) {
     items_.erase(item.handle_);
     if (item.monitored_ && item.subscription_) {

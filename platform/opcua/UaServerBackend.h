@@ -39,6 +39,9 @@ class UaServerBackend final : public OpcServerBackend,
     void ClientConnected() override;
     void ClientDisconnected() override;
     int32_t AddItem(const std::string& itemID, std::shared_ptr<OpcItemSource>& item) override;
+    // One Read of the items' values (an asynchronous read); false without a session.
+    bool Refresh(const std::vector<std::shared_ptr<OpcItemSource>>& items,
+                 std::function<void()> done) override;
     std::string VendorInfo() const override;
 
     UaClient& client() { return *client_; }

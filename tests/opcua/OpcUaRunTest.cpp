@@ -151,6 +151,12 @@ TEST_F(OpcUaRun, ValuesOfEveryTypeArriveAndWritesConvertToTheVariablesType) {
           "16 = 42"})
         EXPECT_NE(all.find(expected), std::string::npos) << expected << "\n" << all;
 
+    // A read asks the server: the value comes back though it did not change.
+    const size_t before = host.seen().size();
+    host.send("read Ua 6");
+    ASSERT_TRUE(host.await("6 = -100000")) << host.seen();
+    EXPECT_NE(host.seen().find("6 = -100000", before), std::string::npos);
+
     // Text that reads as a number goes to an Int16 as that number.
     host.send("write Ua 4 \"321\"");
     EXPECT_TRUE(host.await("4 = 321")) << host.seen();
