@@ -41,8 +41,8 @@ std::string publishResponse(uint32_t n) {
     Writer d(notification);
     d.i32(static_cast<int32_t>(n));
     for (uint32_t k = 0; k < n; ++k) {
-        d.u32(k + 1);   // client handle
-        d.u8(0x05);     // value and source time stamp
+        d.u32(k + 1);  // client handle
+        d.u8(0x05);    // value and source time stamp
         d.u8(static_cast<uint8_t>(BuiltIn::Double));
         d.f64(k * 0.5);
         d.i64(133486382450000000LL);
@@ -56,12 +56,12 @@ std::string publishResponse(uint32_t n) {
     w.u8(0);
     w.i32(-1);
     w.nodeId(NodeId{});
-    w.u8(0);                // response header done
-    w.u32(1);               // subscription id
+    w.u8(0);   // response header done
+    w.u32(1);  // subscription id
     w.i32(1);
-    w.u32(7);               // available sequence numbers
-    w.u8(0);                // more notifications
-    w.u32(7);               // sequence number
+    w.u32(7);  // available sequence numbers
+    w.u8(0);   // more notifications
+    w.u32(7);  // sequence number
     w.i64(0);
     w.i32(1);
     w.nodeId(NodeId::Numeric(id::DataChangeNotification));
@@ -93,9 +93,9 @@ void UaNotificationDecodePerValue(benchmark::State& state) {
         benchmark::DoNotOptimize(cache.data());
     }
     state.SetItemsProcessed(static_cast<int64_t>(state.iterations()) * n);
-    state.counters["ns_per_value"] = benchmark::Counter(
-        static_cast<double>(state.iterations()) * n,
-        benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
+    state.counters["ns_per_value"] =
+        benchmark::Counter(static_cast<double>(state.iterations()) * n,
+                           benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
 }
 BENCHMARK(UaNotificationDecodePerValue)->Arg(1)->Arg(100)->Arg(1000);
 
@@ -103,11 +103,12 @@ void MemoryTagPerValue(benchmark::State& state) {
     ScopedRuntime scope(bench::VirtualRuntime());
     ClsNodeDBInterface host;
     int64_t received = 0;
-    auto sub = host.ValueChange.subscribe([&](VbArray<int32_t>& ids, int16_t n, VbArray<Variant>& values) {
-        received += n;
-        benchmark::DoNotOptimize(ids(1));
-        benchmark::DoNotOptimize(values(1));
-    });
+    auto sub =
+        host.ValueChange.subscribe([&](VbArray<int32_t>& ids, int16_t n, VbArray<Variant>& values) {
+            received += n;
+            benchmark::DoNotOptimize(ids(1));
+            benchmark::DoNotOptimize(values(1));
+        });
     auto db = host.nodeDB();
     db->AddNode("Line1", "MEMTAG");
     const auto line1 = db->getNode("Line1");
@@ -115,9 +116,9 @@ void MemoryTagPerValue(benchmark::State& state) {
     const Variant value(3.5);
     for (auto _ : state) line1->WriteTag("12", value);
     state.SetItemsProcessed(state.iterations());
-    state.counters["ns_per_value"] = benchmark::Counter(
-        static_cast<double>(state.iterations()),
-        benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
+    state.counters["ns_per_value"] =
+        benchmark::Counter(static_cast<double>(state.iterations()),
+                           benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
 }
 BENCHMARK(MemoryTagPerValue);
 
@@ -135,7 +136,8 @@ const std::filesystem::path ServerDir =
 class Peer {
   public:
     Peer() {
-        fifo_ = std::filesystem::temp_directory_path() / ("maroset-ua-bench-" + std::to_string(getpid()));
+        fifo_ = std::filesystem::temp_directory_path() /
+                ("maroset-ua-bench-" + std::to_string(getpid()));
         mkfifo(fifo_.c_str(), 0600);
         const std::string cmd = "cd '" + ServerDir.string() + "' && exec node server.js 0 < '" +
                                 fifo_.string() + "' 2>/dev/null";
@@ -189,10 +191,11 @@ void UaServerToValueChange(benchmark::State& state) {
     auto& loop = Runtime::current().loop();
     ClsNodeDBInterface host;
     int64_t received = 0;
-    auto sub = host.ValueChange.subscribe([&](VbArray<int32_t>&, int16_t n, VbArray<Variant>& values) {
-        received += n;
-        benchmark::DoNotOptimize(values(1));
-    });
+    auto sub =
+        host.ValueChange.subscribe([&](VbArray<int32_t>&, int16_t n, VbArray<Variant>& values) {
+            received += n;
+            benchmark::DoNotOptimize(values(1));
+        });
     auto n = std::make_shared<node>();
     n->Name = "Ua";
     n->DriverName = Variant("OPC");
@@ -216,7 +219,8 @@ void UaServerToValueChange(benchmark::State& state) {
         const auto t0 = std::chrono::steady_clock::now();
         loop.runFor(window);
         const double cpu = cpuSeconds() - cpu0;
-        const double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - t0).count();
+        const double seconds =
+            std::chrono::duration<double>(std::chrono::steady_clock::now() - t0).count();
         char line[256] = {};
         while (other && std::fgets(line, sizeof line, other)) {
             if (line[0] == '{') break;
@@ -225,8 +229,10 @@ void UaServerToValueChange(benchmark::State& state) {
         double nodeValues = 0, nodeCpuUs = 0;
         std::sscanf(line, "{\"values\":%lf,\"cpuUs\":%lf}", &nodeValues, &nodeCpuUs);
         state.counters["values_per_s"] = static_cast<double>(received) / seconds;
-        state.counters["cpu_us_per_value"] = received ? cpu * 1e6 / static_cast<double>(received) : 0;
-        state.counters["node_values_per_s"] = nodeValues / (static_cast<double>(window.count()) / 1000);
+        state.counters["cpu_us_per_value"] =
+            received ? cpu * 1e6 / static_cast<double>(received) : 0;
+        state.counters["node_values_per_s"] =
+            nodeValues / (static_cast<double>(window.count()) / 1000);
         state.counters["node_cpu_us_per_value"] = nodeValues ? nodeCpuUs / nodeValues : 0;
     }
     n->IsActive(false);

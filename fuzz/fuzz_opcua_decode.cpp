@@ -17,12 +17,18 @@ namespace {
 using namespace maroset::platform::opcua;
 
 const StructType* const Responses[] = {
-    &msg::ServiceFault,           &msg::OpenSecureChannelResponse,
-    &msg::CreateSessionResponse,  &msg::ActivateSessionResponse,
-    &msg::ReadResponse,           &msg::WriteResponse,
-    &msg::CreateSubscriptionResponse, &msg::StatusResultsResponse,
-    &msg::CreateMonitoredItemsResponse, &msg::PublishResponse,
-    &msg::DataChangeNotification, &msg::StatusChangeNotification,
+    &msg::ServiceFault,
+    &msg::OpenSecureChannelResponse,
+    &msg::CreateSessionResponse,
+    &msg::ActivateSessionResponse,
+    &msg::ReadResponse,
+    &msg::WriteResponse,
+    &msg::CreateSubscriptionResponse,
+    &msg::StatusResultsResponse,
+    &msg::CreateMonitoredItemsResponse,
+    &msg::PublishResponse,
+    &msg::DataChangeNotification,
+    &msg::StatusChangeNotification,
 };
 
 void decodeAll(std::string_view body, std::vector<Value>& values) {

@@ -173,10 +173,14 @@ std::string NodeIdText(const NodeId& id) {
         s = "ns=" + std::to_string(id.ns) + ";";
     }
     switch (id.kind) {
-        case NodeId::Kind::Numeric: return s + "i=" + std::to_string(id.numeric);
-        case NodeId::Kind::String: return s + "s=" + id.text;
-        case NodeId::Kind::Guid: return s + "g=" + guidText(id.guid);
-        case NodeId::Kind::Opaque: return s + "b=" + base64Text(id.text);
+        case NodeId::Kind::Numeric:
+            return s + "i=" + std::to_string(id.numeric);
+        case NodeId::Kind::String:
+            return s + "s=" + id.text;
+        case NodeId::Kind::Guid:
+            return s + "g=" + guidText(id.guid);
+        case NodeId::Kind::Opaque:
+            return s + "b=" + base64Text(id.text);
     }
     return s;
 }

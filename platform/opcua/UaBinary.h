@@ -57,7 +57,7 @@ struct NodeId {
     uint16_t ns = 0;
     Kind kind = Kind::Numeric;
     uint32_t numeric = 0;
-    std::string text;  // String and Opaque identifiers
+    std::string text;                // String and Opaque identifiers
     std::array<uint8_t, 16> guid{};  // as encoded: Data1..3 little-endian, then Data4
     std::string namespaceUri;
 
@@ -88,7 +88,10 @@ class Reader {
     size_t left() const { return static_cast<size_t>(end_ - p_); }
     const char* position() const { return p_; }
 
-    uint8_t u8() { need(1); return static_cast<uint8_t>(*p_++); }
+    uint8_t u8() {
+        need(1);
+        return static_cast<uint8_t>(*p_++);
+    }
     uint16_t u16() { return fixed<uint16_t>(); }
     uint32_t u32() { return fixed<uint32_t>(); }
     uint64_t u64() { return fixed<uint64_t>(); }
@@ -103,8 +106,16 @@ class Reader {
     // An array length: -1 (null) reads as 0; a length that cannot fit in what is left (each
     // element takes at least minElementSize bytes) fails.
     uint32_t arrayLength(size_t minElementSize = 1);
-    void skip(size_t n) { need(n); p_ += n; }
-    std::string_view take(size_t n) { need(n); std::string_view v(p_, n); p_ += n; return v; }
+    void skip(size_t n) {
+        need(n);
+        p_ += n;
+    }
+    std::string_view take(size_t n) {
+        need(n);
+        std::string_view v(p_, n);
+        p_ += n;
+        return v;
+    }
 
     void nodeId(NodeId& id);
     void expandedNodeId(NodeId& id);

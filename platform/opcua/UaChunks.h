@@ -54,19 +54,19 @@ class UaChunkAssembler {
         uint32_t chunks = 0;
     };
     Limits limits_;
-    std::string pending_;  // bytes of an incomplete chunk
+    std::string pending_;                  // bytes of an incomplete chunk
     std::map<uint32_t, Partial> partial_;  // by request id
     uint64_t generation_ = 0;              // counts resets
 };
 
 // The security policy this client speaks: no signing, no encryption.
-inline constexpr std::string_view SecurityPolicyNone = "http://opcfoundation.org/UA/SecurityPolicy#None";
+inline constexpr std::string_view SecurityPolicyNone =
+    "http://opcfoundation.org/UA/SecurityPolicy#None";
 
 // Appends a message as chunks of at most chunkSize bytes each: type "OPN" (with the
 // asymmetric security header of policy None), "MSG" or "CLO" (with the token id), one
 // sequence number per chunk, counted on from `sequence`.
 void WriteChunks(std::string& out, std::string_view type, uint32_t channelId, uint32_t tokenId,
-                 uint32_t& sequence, uint32_t requestId, std::string_view body,
-                 uint32_t chunkSize);
+                 uint32_t& sequence, uint32_t requestId, std::string_view body, uint32_t chunkSize);
 
 }  // namespace maroset::platform::opcua

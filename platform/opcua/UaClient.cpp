@@ -32,7 +32,6 @@ bool sessionLost(uint32_t s) {
            k == status::BadSecureChannelClosed || k == 0x80870000 /* token unknown */;
 }
 
-
 }  // namespace
 
 bool EndpointUrl::Parse(const std::string& url, EndpointUrl& out) {
@@ -49,8 +48,10 @@ bool EndpointUrl::Parse(const std::string& url, EndpointUrl& out) {
         host = rest.substr(1, close - 1);
         rest = rest.substr(close + 1);
         if (!rest.empty() && rest.front() != ':') return false;
-        if (!rest.empty()) rest = rest.substr(1);
-        else rest = {};
+        if (!rest.empty())
+            rest = rest.substr(1);
+        else
+            rest = {};
         if (!rest.empty() || url.find("]:") != std::string::npos) {
             const auto [p, ec] = std::from_chars(rest.data(), rest.data() + rest.size(), port);
             if (ec != std::errc() || p != rest.data() + rest.size()) return false;
@@ -69,13 +70,20 @@ bool EndpointUrl::Parse(const std::string& url, EndpointUrl& out) {
 
 const char* UaClient::StateName(State s) {
     switch (s) {
-        case State::Idle: return "idle";
-        case State::Connecting: return "connecting";
-        case State::Hello: return "hello";
-        case State::Channel: return "channel";
-        case State::Session: return "session";
-        case State::Active: return "active";
-        case State::Backoff: return "backoff";
+        case State::Idle:
+            return "idle";
+        case State::Connecting:
+            return "connecting";
+        case State::Hello:
+            return "hello";
+        case State::Channel:
+            return "channel";
+        case State::Session:
+            return "session";
+        case State::Active:
+            return "active";
+        case State::Backoff:
+            return "backoff";
     }
     return "?";
 }
@@ -111,8 +119,9 @@ void UaClient::stop() {
     retryTimer_.reset();
     if (state_ == State::Active && stream_) {
         // Said politely; the server forgets the session when the channel goes anyway.
-        send(msg::CloseSessionRequest, [](std::vector<Value>& v) { AddNumber(v, 1); },
-             nextHandle_++, 0);
+        send(
+            msg::CloseSessionRequest, [](std::vector<Value>& v) { AddNumber(v, 1); }, nextHandle_++,
+            0);
     }
     closeStream();
     enter(State::Idle);
@@ -386,67 +395,67 @@ void UaClient::send(const StructType& request, const Fill& fill, uint32_t handle
 void UaClient::createSession() {
     enter(State::Session);
     const std::weak_ptr<bool> alive = alive_;
-    Done done = (
-        [this](uint32_t s, std::vector<Value>& v) {
-            if (state_ != State::Session) return;
-            if (IsBad(s) || v.empty()) {
-                fail("the server refused the session", s ? s : status::BadTimeout);
-                return;
+    Done done = ([this](uint32_t s, std::vector<Value>& v) {
+        if (state_ != State::Session) return;
+        if (IsBad(s) || v.empty()) {
+            fail("the server refused the session", s ? s : status::BadTimeout);
+            return;
+        }
+        const size_t i = AfterHeader(v);
+        authenticationToken_ = v.at(i + 1).node;
+        // The endpoints: is there one with security None, and its anonymous policy?
+        size_t at = i + 5;
+        const uint32_t endpoints = v.at(at++).count;
+        bool none = false;
+        std::optional<std::string> anonymous;
+        for (uint32_t e = 0; e < endpoints; ++e) {
+            ++at;                      // endpointUrl
+            at += 6;                   // application description up to its urls
+            at += 1 + v.at(at).count;  // discoveryUrls
+            ++at;                      // serverCertificate
+            const auto mode = v.at(at++).number;
+            const std::string_view policy = v.at(at++).text;
+            const uint32_t tokens = v.at(at++).count;
+            const bool isNone = mode == MessageSecurityModeNone && policy == SecurityPolicyNone;
+            none = none || isNone;
+            for (uint32_t t = 0; t < tokens; ++t) {
+                if (isNone && v.at(at + 1).number == UserTokenAnonymous && !anonymous)
+                    anonymous = std::string(v.at(at).text);
+                at += 5;
             }
-            const size_t i = AfterHeader(v);
-            authenticationToken_ = v.at(i + 1).node;
-            // The endpoints: is there one with security None, and its anonymous policy?
-            size_t at = i + 5;
-            const uint32_t endpoints = v.at(at++).count;
-            bool none = false;
-            std::optional<std::string> anonymous;
-            for (uint32_t e = 0; e < endpoints; ++e) {
-                ++at;                                  // endpointUrl
-                at += 6;                               // application description up to its urls
-                at += 1 + v.at(at).count;              // discoveryUrls
-                ++at;                                  // serverCertificate
-                const auto mode = v.at(at++).number;
-                const std::string_view policy = v.at(at++).text;
-                const uint32_t tokens = v.at(at++).count;
-                const bool isNone = mode == MessageSecurityModeNone && policy == SecurityPolicyNone;
-                none = none || isNone;
-                for (uint32_t t = 0; t < tokens; ++t) {
-                    if (isNone && v.at(at + 1).number == UserTokenAnonymous && !anonymous)
-                        anonymous = std::string(v.at(at).text);
-                    at += 5;
-                }
-                at += 2;  // transportProfileUri, securityLevel
-            }
-            if (!none) {
-                fail("the server offers no endpoint with security None (only None is supported)",
-                     status::BadSecurityPolicyRejected);
-                return;
-            }
-            if (!anonymous) {
-                fail("the server's None endpoint takes no anonymous user", 0x80210000);
-                return;
-            }
-            activateSession(*anonymous);
-        });
+            at += 2;  // transportProfileUri, securityLevel
+        }
+        if (!none) {
+            fail("the server offers no endpoint with security None (only None is supported)",
+                 status::BadSecurityPolicyRejected);
+            return;
+        }
+        if (!anonymous) {
+            fail("the server's None endpoint takes no anonymous user", 0x80210000);
+            return;
+        }
+        activateSession(*anonymous);
+    });
     const std::string& url = options_.endpointUrl;
-    request(msg::CreateSessionRequest, msg::CreateSessionResponse,
-         [&url](std::vector<Value>& v) {
-             AddText(v, "urn:maroset:opcua-client");
-             AddText(v, "urn:maroset");
-             AddText(v, "Maroset");
-             AddNumber(v, ApplicationTypeClient);
-             AddNull(v);
-             AddNull(v);
-             AddLength(v, 0);
-             AddNull(v);  // serverUri
-             AddText(v, url);
-             AddText(v, "Maroset");
-             AddNull(v);  // nonce: nothing is signed
-             AddNull(v);  // certificate
-             AddValue(v).real = SessionTimeoutMs;
-             AddNumber(v, MaxMessageSize);
-         },
-         std::move(done));
+    request(
+        msg::CreateSessionRequest, msg::CreateSessionResponse,
+        [&url](std::vector<Value>& v) {
+            AddText(v, "urn:maroset:opcua-client");
+            AddText(v, "urn:maroset");
+            AddText(v, "Maroset");
+            AddNumber(v, ApplicationTypeClient);
+            AddNull(v);
+            AddNull(v);
+            AddLength(v, 0);
+            AddNull(v);  // serverUri
+            AddText(v, url);
+            AddText(v, "Maroset");
+            AddNull(v);  // nonce: nothing is signed
+            AddNull(v);  // certificate
+            AddValue(v).real = SessionTimeoutMs;
+            AddNumber(v, MaxMessageSize);
+        },
+        std::move(done));
 }
 
 void UaClient::activateSession(const std::string& policyId) {
@@ -456,62 +465,61 @@ void UaClient::activateSession(const std::string& policyId) {
         w.bytes(policyId);
     }
     const std::weak_ptr<bool> alive = alive_;
-    Done done = (
-        [this](uint32_t s, std::vector<Value>& v) {
-            if (state_ != State::Session) return;
-            if (IsBad(s) || v.empty()) {
-                fail("the server refused the anonymous session", s ? s : status::BadTimeout);
-                return;
-            }
-            readNamespaces();
-        });
-    request(msg::ActivateSessionRequest, msg::ActivateSessionResponse,
-         [&token](std::vector<Value>& v) {
-             AddNull(v);
-             AddNull(v);  // client signature
-             AddLength(v, 0);
-             AddLength(v, 0);
-             Value& t = AddValue(v);
-             t.node = NodeId::Numeric(msg::AnonymousIdentityToken.encodingId);
-             t.number = 1;
-             t.text = *token;
-             AddNull(v);
-             AddNull(v);  // token signature
-         },
-         std::move(done));
+    Done done = ([this](uint32_t s, std::vector<Value>& v) {
+        if (state_ != State::Session) return;
+        if (IsBad(s) || v.empty()) {
+            fail("the server refused the anonymous session", s ? s : status::BadTimeout);
+            return;
+        }
+        readNamespaces();
+    });
+    request(
+        msg::ActivateSessionRequest, msg::ActivateSessionResponse,
+        [&token](std::vector<Value>& v) {
+            AddNull(v);
+            AddNull(v);  // client signature
+            AddLength(v, 0);
+            AddLength(v, 0);
+            Value& t = AddValue(v);
+            t.node = NodeId::Numeric(msg::AnonymousIdentityToken.encodingId);
+            t.number = 1;
+            t.text = *token;
+            AddNull(v);
+            AddNull(v);  // token signature
+        },
+        std::move(done));
 }
 
 void UaClient::readNamespaces() {
     const std::weak_ptr<bool> alive = alive_;
-    Done done = (
-        [this, alive](uint32_t s, std::vector<Value>& v) {
-            if (state_ != State::Session) return;
-            namespaces_.clear();
-            const size_t i = AfterHeader(v);
-            if (!IsBad(s) && v.size() > i + 1 && v[i].count == 1 &&
-                v[i + 1].data.value.isArray()) {
-                for (const Variant& e : v[i + 1].data.value.array())
-                    namespaces_.push_back(e.isString() ? e.string() : std::string());
-            }
-            if (stepTimer_) loop_.cancel(*stepTimer_);
-            stepTimer_.reset();
-            failures_ = 0;
-            retryDelay_ = options_.firstRetry;
-            enter(State::Active);
-            if (alive.expired()) return;
-            topUpPublish();
-        });
-    request(msg::ReadRequest, msg::ReadResponse,
-         [](std::vector<Value>& v) {
-             AddValue(v).real = 0;
-             AddNumber(v, 3);  // no time stamps
-             AddLength(v, 1);
-             AddValue(v).node = NodeId::Numeric(NamespaceArray);
-             AddNumber(v, 13);
-             AddNull(v);
-             AddNull(v);
-         },
-         std::move(done));
+    Done done = ([this, alive](uint32_t s, std::vector<Value>& v) {
+        if (state_ != State::Session) return;
+        namespaces_.clear();
+        const size_t i = AfterHeader(v);
+        if (!IsBad(s) && v.size() > i + 1 && v[i].count == 1 && v[i + 1].data.value.isArray()) {
+            for (const Variant& e : v[i + 1].data.value.array())
+                namespaces_.push_back(e.isString() ? e.string() : std::string());
+        }
+        if (stepTimer_) loop_.cancel(*stepTimer_);
+        stepTimer_.reset();
+        failures_ = 0;
+        retryDelay_ = options_.firstRetry;
+        enter(State::Active);
+        if (alive.expired()) return;
+        topUpPublish();
+    });
+    request(
+        msg::ReadRequest, msg::ReadResponse,
+        [](std::vector<Value>& v) {
+            AddValue(v).real = 0;
+            AddNumber(v, 3);  // no time stamps
+            AddLength(v, 1);
+            AddValue(v).node = NodeId::Numeric(NamespaceArray);
+            AddNumber(v, 13);
+            AddNull(v);
+            AddNull(v);
+        },
+        std::move(done));
 }
 
 void UaClient::respond(uint32_t handle, uint32_t status, std::vector<Value>& values) {
@@ -528,8 +536,8 @@ void UaClient::respond(uint32_t handle, uint32_t status, std::vector<Value>& val
     p.done(status, values);
     // A call the server never answered: the server is as good as gone.
     if (!alive.expired() && status == status::BadTimeout && state_ == State::Active)
-        fail("no answer to a service call within " +
-                 std::to_string(options_.callTimeout.count()) + " ms",
+        fail("no answer to a service call within " + std::to_string(options_.callTimeout.count()) +
+                 " ms",
              status::BadTimeout);
     else if (!alive.expired() && status == status::BadTimeout && state_ != State::Backoff &&
              state_ != State::Idle)
@@ -579,27 +587,28 @@ void UaClient::topUpPublish() {
         const auto handle = nextHandle_++;
         // The server holds a publish request until it has something to say: the silence
         // watch, not this timer, notices a server that is gone.
-        pending_[handle] = Pending{&msg::PublishResponse,
-                                   msg::PublishRequest.encodingId + ResponseOffset, nullptr,
-                                   loop_.schedule(options_.silence * 4,
-                                                  [this, alive, handle] {
-                                                      if (alive.expired()) return;
-                                                      std::vector<Value> none;
-                                                      respond(handle, status::BadTimeout, none);
-                                                  }),
-                                   true};
+        pending_[handle] =
+            Pending{&msg::PublishResponse, msg::PublishRequest.encodingId + ResponseOffset, nullptr,
+                    loop_.schedule(options_.silence * 4,
+                                   [this, alive, handle] {
+                                       if (alive.expired()) return;
+                                       std::vector<Value> none;
+                                       respond(handle, status::BadTimeout, none);
+                                   }),
+                    true};
         ++publishOut_;
         auto acks = std::move(acks_);
         acks_.clear();
-        send(msg::PublishRequest,
-             [&acks](std::vector<Value>& v) {
-                 AddLength(v, static_cast<uint32_t>(acks.size()));
-                 for (const auto& [sub, seq] : acks) {
-                     AddNumber(v, sub);
-                     AddNumber(v, seq);
-                 }
-             },
-             handle, static_cast<uint32_t>((options_.silence * 4).count()));
+        send(
+            msg::PublishRequest,
+            [&acks](std::vector<Value>& v) {
+                AddLength(v, static_cast<uint32_t>(acks.size()));
+                for (const auto& [sub, seq] : acks) {
+                    AddNumber(v, sub);
+                    AddNumber(v, seq);
+                }
+            },
+            handle, static_cast<uint32_t>((options_.silence * 4).count()));
     }
     armSilence();
 }
@@ -649,7 +658,8 @@ void UaClient::onPublish(uint32_t s, std::vector<Value>& v) {
         } else if (eo.node.numeric == id::StatusChangeNotification) {
             Decode(body, msg::StatusChangeNotification, items);
             const auto st = static_cast<uint32_t>(items.at(0).number);
-            if (IsBad(st) && handlers_.subscriptionLost) handlers_.subscriptionLost(subscription, st);
+            if (IsBad(st) && handlers_.subscriptionLost)
+                handlers_.subscriptionLost(subscription, st);
             if (alive.expired()) return;
         }
     }

@@ -145,8 +145,8 @@ class UaClient {
     uint32_t nextRequestId_ = 1;
     uint32_t nextHandle_ = 1;
     NodeId authenticationToken_;
-    std::map<uint32_t, Pending> pending_;  // by request handle (= request id)
-    std::optional<EventLoop::TimerId> stepTimer_;   // connect/hello/channel/session deadline
+    std::map<uint32_t, Pending> pending_;          // by request handle (= request id)
+    std::optional<EventLoop::TimerId> stepTimer_;  // connect/hello/channel/session deadline
     std::optional<EventLoop::TimerId> retryTimer_;
     std::optional<EventLoop::TimerId> renewTimer_;
     std::optional<EventLoop::TimerId> silenceTimer_;
@@ -156,9 +156,9 @@ class UaClient {
     uint32_t publishOut_ = 0;
     std::vector<std::pair<uint32_t, uint32_t>> acks_;  // subscription, sequence number
     std::vector<std::string> namespaces_;
-    std::vector<Value> scratch_;    // request values, reused
-    std::vector<Value> notes_;      // a notification's values, reused
-    std::string out_;               // an encoded request, reused
+    std::vector<Value> scratch_;  // request values, reused
+    std::vector<Value> notes_;    // a notification's values, reused
+    std::string out_;             // an encoded request, reused
     std::string body_;
     std::shared_ptr<bool> alive_ = std::make_shared<bool>(true);
 };

@@ -55,28 +55,47 @@ Variant arrayOf(uint32_t n, T&& element) {
 // One scalar of a Variant as the language's kind.
 Variant scalar(Reader& r, BuiltIn t) {
     switch (t) {
-        case BuiltIn::Boolean: return Variant(r.u8() != 0);
-        case BuiltIn::SByte: return Variant(static_cast<int16_t>(static_cast<int8_t>(r.u8())));
-        case BuiltIn::Byte: return Variant(static_cast<int16_t>(r.u8()));
-        case BuiltIn::Int16: return Variant(r.i16());
-        case BuiltIn::UInt16: return Variant(static_cast<int32_t>(r.u16()));
-        case BuiltIn::Int32: return Variant(r.i32());
-        case BuiltIn::UInt32: return Variant(static_cast<double>(r.u32()));
-        case BuiltIn::Int64: return Variant(static_cast<double>(r.i64()));
-        case BuiltIn::UInt64: return Variant(static_cast<double>(r.u64()));
-        case BuiltIn::Float: return Variant(r.f32());
-        case BuiltIn::Double: return Variant(r.f64());
-        case BuiltIn::String: return Variant(std::string(r.bytes()));
-        case BuiltIn::DateTime: return Variant::FromDate(DateFromTicks(r.i64()));
+        case BuiltIn::Boolean:
+            return Variant(r.u8() != 0);
+        case BuiltIn::SByte:
+            return Variant(static_cast<int16_t>(static_cast<int8_t>(r.u8())));
+        case BuiltIn::Byte:
+            return Variant(static_cast<int16_t>(r.u8()));
+        case BuiltIn::Int16:
+            return Variant(r.i16());
+        case BuiltIn::UInt16:
+            return Variant(static_cast<int32_t>(r.u16()));
+        case BuiltIn::Int32:
+            return Variant(r.i32());
+        case BuiltIn::UInt32:
+            return Variant(static_cast<double>(r.u32()));
+        case BuiltIn::Int64:
+            return Variant(static_cast<double>(r.i64()));
+        case BuiltIn::UInt64:
+            return Variant(static_cast<double>(r.u64()));
+        case BuiltIn::Float:
+            return Variant(r.f32());
+        case BuiltIn::Double:
+            return Variant(r.f64());
+        case BuiltIn::String:
+            return Variant(std::string(r.bytes()));
+        case BuiltIn::DateTime:
+            return Variant::FromDate(DateFromTicks(r.i64()));
         case BuiltIn::LocalizedText: {
             const uint8_t mask = r.u8();
             if (mask & 0x01) (void)r.bytes();
             return Variant(std::string(mask & 0x02 ? r.bytes() : std::string_view()));
         }
         case BuiltIn::ByteString:
-        case BuiltIn::XmlElement: (void)r.bytes(); return Variant();
-        case BuiltIn::Guid: r.skip(16); return Variant();
-        case BuiltIn::StatusCode: (void)r.u32(); return Variant();
+        case BuiltIn::XmlElement:
+            (void)r.bytes();
+            return Variant();
+        case BuiltIn::Guid:
+            r.skip(16);
+            return Variant();
+        case BuiltIn::StatusCode:
+            (void)r.u32();
+            return Variant();
         case BuiltIn::NodeId: {
             NodeId id;
             r.nodeId(id);
@@ -87,7 +106,10 @@ Variant scalar(Reader& r, BuiltIn t) {
             r.expandedNodeId(id);
             return Variant();
         }
-        case BuiltIn::QualifiedName: (void)r.u16(); (void)r.bytes(); return Variant();
+        case BuiltIn::QualifiedName:
+            (void)r.u16();
+            (void)r.bytes();
+            return Variant();
         case BuiltIn::ExtensionObject: {
             NodeId id;
             r.nodeId(id);
@@ -95,10 +117,13 @@ Variant scalar(Reader& r, BuiltIn t) {
             if (encoding != 0) (void)r.bytes();
             return Variant();
         }
-        case BuiltIn::DiagnosticInfo: r.skipDiagnosticInfo(); return Variant();
+        case BuiltIn::DiagnosticInfo:
+            r.skipDiagnosticInfo();
+            return Variant();
         case BuiltIn::DataValue:
         case BuiltIn::Variant:
-        case BuiltIn::Null: break;
+        case BuiltIn::Null:
+            break;
     }
     // A Variant or DataValue inside a Variant: only inside arrays of Variant, which this
     // client does not map; decoded to keep the position right, bounded by the caller.
@@ -132,27 +157,45 @@ void readField(Reader& r, const Field& f, std::vector<Value>& out, int depth) {
     switch (f.type) {
         case BuiltIn::Boolean:
         case BuiltIn::SByte:
-        case BuiltIn::Byte: v.number = r.u8(); break;
+        case BuiltIn::Byte:
+            v.number = r.u8();
+            break;
         case BuiltIn::Int16:
-        case BuiltIn::UInt16: v.number = r.u16(); break;
+        case BuiltIn::UInt16:
+            v.number = r.u16();
+            break;
         case BuiltIn::Int32:
         case BuiltIn::UInt32:
-        case BuiltIn::StatusCode: v.number = r.u32(); break;
+        case BuiltIn::StatusCode:
+            v.number = r.u32();
+            break;
         case BuiltIn::Int64:
         case BuiltIn::UInt64:
-        case BuiltIn::DateTime: v.number = r.u64(); break;
-        case BuiltIn::Float: v.real = r.f32(); break;
-        case BuiltIn::Double: v.real = r.f64(); break;
+        case BuiltIn::DateTime:
+            v.number = r.u64();
+            break;
+        case BuiltIn::Float:
+            v.real = r.f32();
+            break;
+        case BuiltIn::Double:
+            v.real = r.f64();
+            break;
         case BuiltIn::String:
         case BuiltIn::ByteString:
-        case BuiltIn::XmlElement: v.text = r.bytes(); break;
+        case BuiltIn::XmlElement:
+            v.text = r.bytes();
+            break;
         case BuiltIn::Guid: {
             const std::string_view g = r.take(16);
             std::copy(g.begin(), g.end(), v.node.guid.begin());
             break;
         }
-        case BuiltIn::NodeId: r.nodeId(v.node); break;
-        case BuiltIn::ExpandedNodeId: r.expandedNodeId(v.node); break;
+        case BuiltIn::NodeId:
+            r.nodeId(v.node);
+            break;
+        case BuiltIn::ExpandedNodeId:
+            r.expandedNodeId(v.node);
+            break;
         case BuiltIn::QualifiedName:
             v.number = r.u16();
             v.text = r.bytes();
@@ -170,10 +213,17 @@ void readField(Reader& r, const Field& f, std::vector<Value>& out, int depth) {
             v.number = encoding;
             break;
         }
-        case BuiltIn::DataValue: DecodeDataValue(r, v.data); break;
-        case BuiltIn::Variant: DecodeVariant(r, v.data); break;
-        case BuiltIn::DiagnosticInfo: r.skipDiagnosticInfo(); break;
-        case BuiltIn::Null: break;
+        case BuiltIn::DataValue:
+            DecodeDataValue(r, v.data);
+            break;
+        case BuiltIn::Variant:
+            DecodeVariant(r, v.data);
+            break;
+        case BuiltIn::DiagnosticInfo:
+            r.skipDiagnosticInfo();
+            break;
+        case BuiltIn::Null:
+            break;
     }
 }
 
@@ -210,27 +260,45 @@ void writeField(Writer& w, const Field& f, std::span<const Value> values, size_t
     if (at >= values.size() || values[at].isLength) misuse("value expected");
     const Value& v = values[at++];
     switch (f.type) {
-        case BuiltIn::Boolean: w.u8(v.number ? 1 : 0); break;
+        case BuiltIn::Boolean:
+            w.u8(v.number ? 1 : 0);
+            break;
         case BuiltIn::SByte:
-        case BuiltIn::Byte: w.u8(static_cast<uint8_t>(v.number)); break;
+        case BuiltIn::Byte:
+            w.u8(static_cast<uint8_t>(v.number));
+            break;
         case BuiltIn::Int16:
-        case BuiltIn::UInt16: w.u16(static_cast<uint16_t>(v.number)); break;
+        case BuiltIn::UInt16:
+            w.u16(static_cast<uint16_t>(v.number));
+            break;
         case BuiltIn::Int32:
         case BuiltIn::UInt32:
-        case BuiltIn::StatusCode: w.u32(static_cast<uint32_t>(v.number)); break;
+        case BuiltIn::StatusCode:
+            w.u32(static_cast<uint32_t>(v.number));
+            break;
         case BuiltIn::Int64:
         case BuiltIn::UInt64:
-        case BuiltIn::DateTime: w.u64(v.number); break;
-        case BuiltIn::Float: w.f32(static_cast<float>(v.real)); break;
-        case BuiltIn::Double: w.f64(v.real); break;
+        case BuiltIn::DateTime:
+            w.u64(v.number);
+            break;
+        case BuiltIn::Float:
+            w.f32(static_cast<float>(v.real));
+            break;
+        case BuiltIn::Double:
+            w.f64(v.real);
+            break;
         case BuiltIn::String:
         case BuiltIn::ByteString:
-        case BuiltIn::XmlElement: w.bytes(v.text, v.null); break;
+        case BuiltIn::XmlElement:
+            w.bytes(v.text, v.null);
+            break;
         case BuiltIn::Guid:
             w.out().append(reinterpret_cast<const char*>(v.node.guid.data()), 16);
             break;
         case BuiltIn::NodeId:
-        case BuiltIn::ExpandedNodeId: w.nodeId(v.node); break;
+        case BuiltIn::ExpandedNodeId:
+            w.nodeId(v.node);
+            break;
         case BuiltIn::QualifiedName:
             w.u16(static_cast<uint16_t>(v.number));
             w.bytes(v.text, v.null);
@@ -256,32 +324,62 @@ void writeField(Writer& w, const Field& f, std::span<const Value> values, size_t
             w.u8(0x01);  // the value alone: the server stamps its own times
             EncodeVariant(w, v.data.value, v.data.type);
             break;
-        case BuiltIn::Variant: EncodeVariant(w, v.data.value, v.data.type); break;
-        case BuiltIn::DiagnosticInfo: w.u8(0); break;
-        case BuiltIn::Null: break;
+        case BuiltIn::Variant:
+            EncodeVariant(w, v.data.value, v.data.type);
+            break;
+        case BuiltIn::DiagnosticInfo:
+            w.u8(0);
+            break;
+        case BuiltIn::Null:
+            break;
     }
 }
 
 void writeScalar(Writer& w, const Variant& v, BuiltIn t) {
     switch (t) {
-        case BuiltIn::Boolean: w.u8(v.boolean() ? 1 : 0); break;
+        case BuiltIn::Boolean:
+            w.u8(v.boolean() ? 1 : 0);
+            break;
         case BuiltIn::SByte:
-        case BuiltIn::Byte: w.u8(static_cast<uint8_t>(v.integer())); break;
-        case BuiltIn::Int16: w.u16(static_cast<uint16_t>(v.integer())); break;
-        case BuiltIn::UInt16: w.u16(static_cast<uint16_t>(v.lng())); break;
-        case BuiltIn::Int32: w.i32(v.lng()); break;
-        case BuiltIn::UInt32: w.u32(static_cast<uint32_t>(v.dbl())); break;
-        case BuiltIn::Int64: w.i64(static_cast<int64_t>(v.dbl())); break;
-        case BuiltIn::UInt64: w.u64(static_cast<uint64_t>(v.dbl())); break;
-        case BuiltIn::Float: w.f32(v.single()); break;
-        case BuiltIn::Double: w.f64(v.dbl()); break;
-        case BuiltIn::String: w.bytes(v.string()); break;
+        case BuiltIn::Byte:
+            w.u8(static_cast<uint8_t>(v.integer()));
+            break;
+        case BuiltIn::Int16:
+            w.u16(static_cast<uint16_t>(v.integer()));
+            break;
+        case BuiltIn::UInt16:
+            w.u16(static_cast<uint16_t>(v.lng()));
+            break;
+        case BuiltIn::Int32:
+            w.i32(v.lng());
+            break;
+        case BuiltIn::UInt32:
+            w.u32(static_cast<uint32_t>(v.dbl()));
+            break;
+        case BuiltIn::Int64:
+            w.i64(static_cast<int64_t>(v.dbl()));
+            break;
+        case BuiltIn::UInt64:
+            w.u64(static_cast<uint64_t>(v.dbl()));
+            break;
+        case BuiltIn::Float:
+            w.f32(v.single());
+            break;
+        case BuiltIn::Double:
+            w.f64(v.dbl());
+            break;
+        case BuiltIn::String:
+            w.bytes(v.string());
+            break;
         case BuiltIn::LocalizedText:
             w.u8(0x02);
             w.bytes(v.string());
             break;
-        case BuiltIn::DateTime: w.i64(TicksFromDate(v.date())); break;
-        default: misuse("no language kind for this type");
+        case BuiltIn::DateTime:
+            w.i64(TicksFromDate(v.date()));
+            break;
+        default:
+            misuse("no language kind for this type");
     }
 }
 
@@ -305,7 +403,9 @@ bool convertScalar(const Variant& in, BuiltIn type, Variant& out, bool& range) {
     if (in.isArray() || in.isObject() || in.isNull()) return false;
     double d = 0;
     switch (type) {
-        case BuiltIn::Boolean: out = Variant(CBool(in)); return true;
+        case BuiltIn::Boolean:
+            out = Variant(CBool(in));
+            return true;
         case BuiltIn::SByte:
             if (!whole(in, -128, 127, d, range)) return false;
             out = Variant(static_cast<int16_t>(d));
@@ -314,12 +414,16 @@ bool convertScalar(const Variant& in, BuiltIn type, Variant& out, bool& range) {
             if (!whole(in, 0, 255, d, range)) return false;
             out = Variant(static_cast<int16_t>(d));
             return true;
-        case BuiltIn::Int16: out = Variant(CInt(in)); return true;
+        case BuiltIn::Int16:
+            out = Variant(CInt(in));
+            return true;
         case BuiltIn::UInt16:
             if (!whole(in, 0, 65535, d, range)) return false;
             out = Variant(static_cast<int32_t>(d));
             return true;
-        case BuiltIn::Int32: out = Variant(CLng(in)); return true;
+        case BuiltIn::Int32:
+            out = Variant(CLng(in));
+            return true;
         case BuiltIn::UInt32:
             if (!whole(in, 0, 4294967295.0, d, range)) return false;
             out = Variant(d);
@@ -332,12 +436,21 @@ bool convertScalar(const Variant& in, BuiltIn type, Variant& out, bool& range) {
             if (!whole(in, 0, 18446744073709549568.0, d, range)) return false;
             out = Variant(d);
             return true;
-        case BuiltIn::Float: out = Variant(CSng(in)); return true;
-        case BuiltIn::Double: out = Variant(CDbl(in)); return true;
+        case BuiltIn::Float:
+            out = Variant(CSng(in));
+            return true;
+        case BuiltIn::Double:
+            out = Variant(CDbl(in));
+            return true;
         case BuiltIn::String:
-        case BuiltIn::LocalizedText: out = Variant(CStr(in)); return true;
-        case BuiltIn::DateTime: out = Variant::FromDate(CDate(in)); return true;
-        default: return false;
+        case BuiltIn::LocalizedText:
+            out = Variant(CStr(in));
+            return true;
+        case BuiltIn::DateTime:
+            out = Variant::FromDate(CDate(in));
+            return true;
+        default:
+            return false;
     }
 }
 

@@ -50,21 +50,29 @@ struct StructType {
 struct Value {
     BuiltIn type = BuiltIn::Null;
     bool isLength = false;
-    bool null = false;          // encode a null String/ByteString
-    uint32_t count = 0;         // array length
-    uint64_t number = 0;        // Boolean, the integers, StatusCode, DateTime ticks
-    double real = 0;            // Float, Double
-    std::string_view text;      // String, ByteString, LocalizedText's text, QualifiedName's
-                                // name, ExtensionObject's body
-    NodeId node;                // NodeId, ExpandedNodeId, ExtensionObject's type
-    DataValue data;             // Variant and DataValue
+    bool null = false;      // encode a null String/ByteString
+    uint32_t count = 0;     // array length
+    uint64_t number = 0;    // Boolean, the integers, StatusCode, DateTime ticks
+    double real = 0;        // Float, Double
+    std::string_view text;  // String, ByteString, LocalizedText's text, QualifiedName's
+                            // name, ExtensionObject's body
+    NodeId node;            // NodeId, ExpandedNodeId, ExtensionObject's type
+    DataValue data;         // Variant and DataValue
 };
 
 // Appending a request's values in walk order.
-inline Value& AddValue(std::vector<Value>& v) { return v.emplace_back(); }
-inline void AddNumber(std::vector<Value>& v, uint64_t n) { v.emplace_back().number = n; }
-inline void AddText(std::vector<Value>& v, std::string_view t) { v.emplace_back().text = t; }
-inline void AddNull(std::vector<Value>& v) { v.emplace_back().null = true; }
+inline Value& AddValue(std::vector<Value>& v) {
+    return v.emplace_back();
+}
+inline void AddNumber(std::vector<Value>& v, uint64_t n) {
+    v.emplace_back().number = n;
+}
+inline void AddText(std::vector<Value>& v, std::string_view t) {
+    v.emplace_back().text = t;
+}
+inline void AddNull(std::vector<Value>& v) {
+    v.emplace_back().null = true;
+}
 inline void AddLength(std::vector<Value>& v, uint32_t n) {
     Value& l = v.emplace_back();
     l.isLength = true;

@@ -25,38 +25,51 @@ constexpr std::chrono::milliseconds CallWait{2500};  // the client gives up at 2
 
 int32_t qualityOf(uint32_t status) {
     switch (status >> 30) {
-        case 0: return QualityGood;
-        case 1: return QualityUncertain;
-        default: break;
+        case 0:
+            return QualityGood;
+        case 1:
+            return QualityUncertain;
+        default:
+            break;
     }
     switch (status & 0xFFFF0000u) {
         case status::BadNotConnected:
-        case status::BadServerNotConnected: return QualityNotConnected;
+        case status::BadServerNotConnected:
+            return QualityNotConnected;
         case status::BadCommunicationError:
         case status::BadNoCommunication:
-        case status::BadTimeout: return QualityCommFailure;
-        case status::BadOutOfService: return QualityOutOfService;
+        case status::BadTimeout:
+            return QualityCommFailure;
+        case status::BadOutOfService:
+            return QualityOutOfService;
         case status::BadConfigurationError:
         case status::BadNodeIdUnknown:
         case status::BadNodeIdInvalid:
-        case status::BadTypeMismatch: return QualityConfigError;
-        default: return 0;
+        case status::BadTypeMismatch:
+            return QualityConfigError;
+        default:
+            return 0;
     }
 }
 
 int32_t resultOf(uint32_t status) {
     if (!IsBad(status)) return opc::S_OK;
     switch (status & 0xFFFF0000u) {
-        case status::BadNodeIdUnknown: return opc::OPC_E_UNKNOWNITEMID;
-        case status::BadNodeIdInvalid: return opc::OPC_E_INVALIDITEMID;
+        case status::BadNodeIdUnknown:
+            return opc::OPC_E_UNKNOWNITEMID;
+        case status::BadNodeIdInvalid:
+            return opc::OPC_E_INVALIDITEMID;
         case status::BadNotWritable:
-        case status::BadUserAccessDenied: return opc::OPC_E_BADRIGHTS;
-        case status::BadTypeMismatch: return opc::OPC_E_BADTYPE;
-        case status::BadOutOfRange: return opc::OPC_E_RANGE;
-        default: return opc::E_FAIL;
+        case status::BadUserAccessDenied:
+            return opc::OPC_E_BADRIGHTS;
+        case status::BadTypeMismatch:
+            return opc::OPC_E_BADTYPE;
+        case status::BadOutOfRange:
+            return opc::OPC_E_RANGE;
+        default:
+            return opc::E_FAIL;
     }
 }
-
 
 }  // namespace
 
@@ -82,7 +95,7 @@ class UaItem final : public OpcItemSource {
     // What the backend keeps of the item.
     std::shared_ptr<UaServerBackend> backend_;
     std::string itemID_;
-    NodeId node_;      // as given: an "nsu=" namespace is looked up on each session
+    NodeId node_;  // as given: an "nsu=" namespace is looked up on each session
     NodeId resolved_node_;
     uint32_t handle_;
     bool resolved_ = false;
@@ -128,7 +141,7 @@ int32_t UaItem::Write(const Variant& value) {
             d.data.type = type;
         },
         [&done, &result, alive = std::weak_ptr<bool>(b.alive_), &b](uint32_t s,
-                                                                     std::vector<Value>& v) {
+                                                                    std::vector<Value>& v) {
             const size_t i = AfterHeader(v);
             result = IsBad(s) || v.size() < i + 2 ? (s ? s : status::BadCommunicationError)
                                                   : static_cast<uint32_t>(v[i + 1].number);
@@ -145,8 +158,8 @@ int32_t UaItem::Write(const Variant& value) {
 }
 
 void UaItem::Scan(const OpcScan& scan) {
-    const bool changed = !scanned_ || scan.active != scan_.active ||
-                         scan.updateRate != scan_.updateRate;
+    const bool changed =
+        !scanned_ || scan.active != scan_.active || scan.updateRate != scan_.updateRate;
     scan_ = scan;
     scanned_ = true;
     UaServerBackend& b = *backend_;
@@ -235,8 +248,7 @@ std::string UaServerBackend::VendorInfo() const {
     return "Maroset OPC UA client, " + url_;
 }
 
-int32_t UaServerBackend::AddItem(const std::string& itemID,
-                                 std::shared_ptr<OpcItemSource>& item) {
+int32_t UaServerBackend::AddItem(const std::string& itemID, std::shared_ptr<OpcItemSource>& item) {
     NodeId node;
     if (!ParseNodeId(itemID, node)) {
         trace("item " + itemID + " refused: not a node id", status::BadNodeIdInvalid);
@@ -252,9 +264,10 @@ int32_t UaServerBackend::AddItem(const std::string& itemID,
         resolveAll();
         waitFor([&ua] { return ua->resolved_ || ua->failed_; }, CallWait);
         if (ua->failed_) {
-            const int32_t result = ua->state_.quality == QualityConfigError && ua->dataType_ == BuiltIn::Null
-                                       ? opc::OPC_E_UNKNOWNITEMID
-                                       : opc::E_FAIL;
+            const int32_t result =
+                ua->state_.quality == QualityConfigError && ua->dataType_ == BuiltIn::Null
+                    ? opc::OPC_E_UNKNOWNITEMID
+                    : opc::E_FAIL;
             return result;
         }
     }
@@ -422,9 +435,8 @@ void UaServerBackend::resolveAll() {
                 DataValue& access = v[i + 1 + 2 * k].data;
                 DataValue& value = v[i + 2 + 2 * k].data;
                 const uint32_t refused = IsBad(access.status) ? access.status : value.status;
-                if (IsBad(access.status) ||
-                    (IsBad(value.status) &&
-                     (value.status & 0xFFFF0000u) == status::BadNodeIdUnknown)) {
+                if (IsBad(access.status) || (IsBad(value.status) && (value.status & 0xFFFF0000u) ==
+                                                                        status::BadNodeIdUnknown)) {
                     item.failed_ = true;
                     item.dataType_ = BuiltIn::Null;
                     item.state_.quality = QualityConfigError;
@@ -432,9 +444,8 @@ void UaServerBackend::resolveAll() {
                     trace("item " + item.itemID_ + " refused", refused);
                     continue;
                 }
-                item.accessLevel_ = access.value.isNumber() ? static_cast<uint8_t>(
-                                                                  access.value.integer())
-                                                            : 0;
+                item.accessLevel_ =
+                    access.value.isNumber() ? static_cast<uint8_t>(access.value.integer()) : 0;
                 item.dataType_ = value.type;
                 item.array_ = value.array;
                 item.state_.value = std::move(value.value);

@@ -77,8 +77,8 @@ class UaServerBackend final : public OpcServerBackend,
     bool syncing_ = false;
     bool syncPosted_ = false;
     uint32_t nextHandle_ = 1;
-    std::map<uint32_t, UaItem*> items_;  // by client handle
-    std::map<int32_t, Subscription> subscriptions_;  // by update rate
+    std::map<uint32_t, UaItem*> items_;                  // by client handle
+    std::map<int32_t, Subscription> subscriptions_;      // by update rate
     std::vector<std::pair<uint32_t, uint32_t>> doomed_;  // subscription, monitored item
     std::set<std::string> nodes_;
     std::shared_ptr<bool> alive_ = std::make_shared<bool>(true);

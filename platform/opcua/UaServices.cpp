@@ -8,10 +8,18 @@ namespace {
 
 using B = BuiltIn;
 
-constexpr Field one(B t) { return Field{t, false, nullptr}; }
-constexpr Field many(B t) { return Field{t, true, nullptr}; }
-constexpr Field one(const StructType& s) { return Field{B::Null, false, &s}; }
-constexpr Field many(const StructType& s) { return Field{B::Null, true, &s}; }
+constexpr Field one(B t) {
+    return Field{t, false, nullptr};
+}
+constexpr Field many(B t) {
+    return Field{t, true, nullptr};
+}
+constexpr Field one(const StructType& s) {
+    return Field{B::Null, false, &s};
+}
+constexpr Field many(const StructType& s) {
+    return Field{B::Null, true, &s};
+}
 
 // Enumerations travel as Int32.
 constexpr B Enum = B::Int32;
@@ -21,11 +29,11 @@ constexpr B Enum = B::Int32;
 namespace msg {
 
 namespace {
-const Field requestHeader[] = {one(B::NodeId),   one(B::DateTime), one(B::UInt32), one(B::UInt32),
-                               one(B::String),   one(B::UInt32),   one(B::ExtensionObject)};
-const Field responseHeader[] = {one(B::DateTime),       one(B::UInt32),
-                                one(B::StatusCode),     one(B::DiagnosticInfo),
-                                many(B::String),        one(B::ExtensionObject)};
+const Field requestHeader[] = {one(B::NodeId),         one(B::DateTime), one(B::UInt32),
+                               one(B::UInt32),         one(B::String),   one(B::UInt32),
+                               one(B::ExtensionObject)};
+const Field responseHeader[] = {one(B::DateTime),       one(B::UInt32),  one(B::StatusCode),
+                                one(B::DiagnosticInfo), many(B::String), one(B::ExtensionObject)};
 }  // namespace
 const StructType RequestHeader{"RequestHeader", 0, requestHeader};
 const StructType ResponseHeader{"ResponseHeader", 0, responseHeader};
@@ -45,8 +53,8 @@ const Field closeChannel[] = {one(RequestHeader)};
 
 // applicationUri, productUri, applicationName, applicationType, gatewayServerUri,
 // discoveryProfileUri, discoveryUrls
-const Field applicationDescription[] = {one(B::String),   one(B::String), one(B::LocalizedText),
-                                        one(Enum),        one(B::String), one(B::String),
+const Field applicationDescription[] = {one(B::String), one(B::String), one(B::LocalizedText),
+                                        one(Enum),      one(B::String), one(B::String),
                                         many(B::String)};
 const StructType ApplicationDescription{"ApplicationDescription", 0, applicationDescription};
 // policyId, tokenType, issuedTokenType, issuerEndpointUrl, securityPolicyUri
@@ -55,10 +63,9 @@ const Field userTokenPolicy[] = {one(B::String), one(Enum), one(B::String), one(
 const StructType UserTokenPolicy{"UserTokenPolicy", 0, userTokenPolicy};
 // endpointUrl, server, serverCertificate, securityMode, securityPolicyUri, userIdentityTokens,
 // transportProfileUri, securityLevel
-const Field endpointDescription[] = {one(B::String),         one(ApplicationDescription),
-                                     one(B::ByteString),     one(Enum),
-                                     one(B::String),         many(UserTokenPolicy),
-                                     one(B::String),         one(B::Byte)};
+const Field endpointDescription[] = {
+    one(B::String), one(ApplicationDescription), one(B::ByteString), one(Enum),
+    one(B::String), many(UserTokenPolicy),       one(B::String),     one(B::Byte)};
 const StructType EndpointDescription{"EndpointDescription", 0, endpointDescription};
 const Field signedSoftwareCertificate[] = {one(B::ByteString), one(B::ByteString)};
 const StructType SignedSoftwareCertificate{"SignedSoftwareCertificate", 0,
@@ -68,27 +75,27 @@ const StructType SignatureData{"SignatureData", 0, signatureData};
 
 // header, clientDescription, serverUri, endpointUrl, sessionName, clientNonce,
 // clientCertificate, requestedSessionTimeout, maxResponseMessageSize
-const Field createSessionRequest[] = {one(RequestHeader),     one(ApplicationDescription),
-                                      one(B::String),         one(B::String),
-                                      one(B::String),         one(B::ByteString),
-                                      one(B::ByteString),     one(B::Double),
-                                      one(B::UInt32)};
+const Field createSessionRequest[] = {
+    one(RequestHeader), one(ApplicationDescription), one(B::String), one(B::String), one(B::String),
+    one(B::ByteString), one(B::ByteString),          one(B::Double), one(B::UInt32)};
 // header, sessionId, authenticationToken, revisedSessionTimeout, serverNonce,
 // serverCertificate, serverEndpoints, serverSoftwareCertificates, serverSignature,
 // maxRequestMessageSize
-const Field createSessionResponse[] = {one(ResponseHeader),       one(B::NodeId),
-                                       one(B::NodeId),            one(B::Double),
-                                       one(B::ByteString),        one(B::ByteString),
-                                       many(EndpointDescription), many(SignedSoftwareCertificate),
-                                       one(SignatureData),        one(B::UInt32)};
+const Field createSessionResponse[] = {one(ResponseHeader),
+                                       one(B::NodeId),
+                                       one(B::NodeId),
+                                       one(B::Double),
+                                       one(B::ByteString),
+                                       one(B::ByteString),
+                                       many(EndpointDescription),
+                                       many(SignedSoftwareCertificate),
+                                       one(SignatureData),
+                                       one(B::UInt32)};
 // header, clientSignature, clientSoftwareCertificates, localeIds, userIdentityToken,
 // userTokenSignature
-const Field activateSessionRequest[] = {one(RequestHeader),
-                                        one(SignatureData),
-                                        many(SignedSoftwareCertificate),
-                                        many(B::String),
-                                        one(B::ExtensionObject),
-                                        one(SignatureData)};
+const Field activateSessionRequest[] = {
+    one(RequestHeader), one(SignatureData),      many(SignedSoftwareCertificate),
+    many(B::String),    one(B::ExtensionObject), one(SignatureData)};
 // header, serverNonce, results, diagnosticInfos
 const Field activateSessionResponse[] = {one(ResponseHeader), one(B::ByteString),
                                          many(B::StatusCode), many(B::DiagnosticInfo)};
@@ -96,8 +103,7 @@ const Field activateSessionResponse[] = {one(ResponseHeader), one(B::ByteString)
 const Field closeSessionRequest[] = {one(RequestHeader), one(B::Boolean)};
 
 // nodeId, attributeId, indexRange, dataEncoding
-const Field readValueId[] = {one(B::NodeId), one(B::UInt32), one(B::String),
-                             one(B::QualifiedName)};
+const Field readValueId[] = {one(B::NodeId), one(B::UInt32), one(B::String), one(B::QualifiedName)};
 const StructType ReadValueId{"ReadValueId", 0, readValueId};
 // header, maxAge, timestampsToReturn, nodesToRead
 const Field readRequest[] = {one(RequestHeader), one(B::Double), one(Enum), many(ReadValueId)};
@@ -106,13 +112,12 @@ const Field readResponse[] = {one(ResponseHeader), many(B::DataValue), many(B::D
 const Field writeValue[] = {one(B::NodeId), one(B::UInt32), one(B::String), one(B::DataValue)};
 const StructType WriteValue{"WriteValue", 0, writeValue};
 const Field writeRequest[] = {one(RequestHeader), many(WriteValue)};
-const Field statusResults[] = {one(ResponseHeader), many(B::StatusCode),
-                               many(B::DiagnosticInfo)};
+const Field statusResults[] = {one(ResponseHeader), many(B::StatusCode), many(B::DiagnosticInfo)};
 
 // header, requestedPublishingInterval, requestedLifetimeCount, requestedMaxKeepAliveCount,
 // maxNotificationsPerPublish, publishingEnabled, priority
-const Field createSubscriptionRequest[] = {one(RequestHeader), one(B::Double),  one(B::UInt32),
-                                           one(B::UInt32),     one(B::UInt32),  one(B::Boolean),
+const Field createSubscriptionRequest[] = {one(RequestHeader), one(B::Double), one(B::UInt32),
+                                           one(B::UInt32),     one(B::UInt32), one(B::Boolean),
                                            one(B::Byte)};
 // header, subscriptionId, revisedPublishingInterval, revisedLifetimeCount,
 // revisedMaxKeepAliveCount
@@ -126,8 +131,7 @@ const Field monitoringParameters[] = {one(B::UInt32), one(B::Double), one(B::Ext
                                       one(B::UInt32), one(B::Boolean)};
 const StructType MonitoringParameters{"MonitoringParameters", 0, monitoringParameters};
 // itemToMonitor, monitoringMode, requestedParameters
-const Field monitoredItemCreateRequest[] = {one(ReadValueId), one(Enum),
-                                            one(MonitoringParameters)};
+const Field monitoredItemCreateRequest[] = {one(ReadValueId), one(Enum), one(MonitoringParameters)};
 const StructType MonitoredItemCreateRequest{"MonitoredItemCreateRequest", 0,
                                             monitoredItemCreateRequest};
 // header, subscriptionId, timestampsToReturn, itemsToCreate
@@ -157,10 +161,9 @@ const Field notificationMessage[] = {one(B::UInt32), one(B::DateTime), many(B::E
 const StructType NotificationMessage{"NotificationMessage", 0, notificationMessage};
 // header, subscriptionId, availableSequenceNumbers, moreNotifications, notificationMessage,
 // results, diagnosticInfos
-const Field publishResponse[] = {one(ResponseHeader),     one(B::UInt32),
-                                 many(B::UInt32),         one(B::Boolean),
-                                 one(NotificationMessage), many(B::StatusCode),
-                                 many(B::DiagnosticInfo)};
+const Field publishResponse[] = {
+    one(ResponseHeader),      one(B::UInt32),      many(B::UInt32),        one(B::Boolean),
+    one(NotificationMessage), many(B::StatusCode), many(B::DiagnosticInfo)};
 // clientHandle, value
 const Field monitoredItemNotification[] = {one(B::UInt32), one(B::DataValue)};
 const StructType MonitoredItemNotification{"MonitoredItemNotification", 0,
@@ -188,17 +191,15 @@ const StructType WriteRequest{"WriteRequest", 673, writeRequest};
 const StructType WriteResponse{"WriteResponse", id::WriteResponse, statusResults};
 const StructType CreateSubscriptionRequest{"CreateSubscriptionRequest", 787,
                                            createSubscriptionRequest};
-const StructType CreateSubscriptionResponse{"CreateSubscriptionResponse",
-                                            id::CreateSubscriptionResponse,
-                                            createSubscriptionResponse};
+const StructType CreateSubscriptionResponse{
+    "CreateSubscriptionResponse", id::CreateSubscriptionResponse, createSubscriptionResponse};
 const StructType SetPublishingModeRequest{"SetPublishingModeRequest", 799,
                                           setPublishingModeRequest};
 const StructType StatusResultsResponse{"StatusResultsResponse", 0, statusResults};
 const StructType CreateMonitoredItemsRequest{"CreateMonitoredItemsRequest", 751,
                                              createMonitoredItemsRequest};
-const StructType CreateMonitoredItemsResponse{"CreateMonitoredItemsResponse",
-                                              id::CreateMonitoredItemsResponse,
-                                              createMonitoredItemsResponse};
+const StructType CreateMonitoredItemsResponse{
+    "CreateMonitoredItemsResponse", id::CreateMonitoredItemsResponse, createMonitoredItemsResponse};
 const StructType DeleteMonitoredItemsRequest{"DeleteMonitoredItemsRequest", 781,
                                              deleteMonitoredItemsRequest};
 const StructType SetMonitoringModeRequest{"SetMonitoringModeRequest", 769,
@@ -209,8 +210,8 @@ const StructType PublishRequest{"PublishRequest", 826, publishRequest};
 const StructType PublishResponse{"PublishResponse", id::PublishResponse, publishResponse};
 const StructType DataChangeNotification{"DataChangeNotification", id::DataChangeNotification,
                                         dataChangeNotification};
-const StructType StatusChangeNotification{"StatusChangeNotification",
-                                          id::StatusChangeNotification, statusChangeNotification};
+const StructType StatusChangeNotification{"StatusChangeNotification", id::StatusChangeNotification,
+                                          statusChangeNotification};
 const StructType AnonymousIdentityToken{"AnonymousIdentityToken", 321, anonymousIdentityToken};
 
 }  // namespace msg
@@ -290,7 +291,7 @@ void AppendRequestHeader(std::vector<Value>& values, const NodeId& token, int64_
     t.node = token;
     values.emplace_back().number = static_cast<uint64_t>(ticks);
     values.emplace_back().number = handle;
-    values.emplace_back();  // returnDiagnostics: none
+    values.emplace_back();              // returnDiagnostics: none
     values.emplace_back().null = true;  // auditEntryId
     values.emplace_back().number = timeoutMs;
     values.emplace_back();  // additionalHeader: none

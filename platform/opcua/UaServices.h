@@ -98,7 +98,9 @@ constexpr uint32_t BadServerNotConnected = 0x800D0000;
 // The symbolic name of a status code ("BadNodeIdUnknown"), or its number in hexadecimal
 // ("0x80AB0000") for one this client does not know.
 std::string StatusName(uint32_t code);
-inline bool IsBad(uint32_t code) { return (code & 0x80000000u) != 0; }
+inline bool IsBad(uint32_t code) {
+    return (code & 0x80000000u) != 0;
+}
 
 // Where a response's own values start, after its header's (whose string table has a
 // length of its own).

@@ -17,7 +17,8 @@ namespace {
 
 using namespace std::chrono_literals;
 
-const std::filesystem::path ServerDir = std::filesystem::path(MAROSET_SOURCE_DIR) / "tests/opcua/server";
+const std::filesystem::path ServerDir =
+    std::filesystem::path(MAROSET_SOURCE_DIR) / "tests/opcua/server";
 
 bool haveNode() {
     return std::system("command -v node > /dev/null 2>&1") == 0;
@@ -37,7 +38,10 @@ class UaServer {
         }
         if (endpoint_.empty()) throw std::runtime_error("the OPC UA test server did not start");
     }
-    ~UaServer() { process_.write("quit\n"); (void)process_.wait(5000ms); }
+    ~UaServer() {
+        process_.write("quit\n");
+        (void)process_.wait(5000ms);
+    }
 
     const std::string& endpoint() const { return endpoint_; }
     int port() const { return std::stoi(endpoint_.substr(endpoint_.rfind(':') + 1)); }
@@ -67,8 +71,8 @@ class Host {
                      "UpdateRate INTEGER, CommPort INTEGER, BaudRate INTEGER, TagPrefex TEXT, "
                      "IPAddress TEXT, Port INTEGER);"
                      "INSERT INTO Nodes (Name, Driver, OPCServer, OPCTopic, UpdateRate, TagPrefex) "
-                     "VALUES ('Ua', 'OPC', '" + endpoint + "', 'Ua', " + std::to_string(rate) +
-                         ", '" + prefix + "');");
+                     "VALUES ('Ua', 'OPC', '" +
+                         endpoint + "', 'Ua', " + std::to_string(rate) + ", '" + prefix + "');");
         process_.emplace(std::vector<std::string>{
             "/bin/sh", "-c",
             std::string("exec '") + MAROSET_CLI_PATH + "' run '" + project_.string() +
@@ -136,8 +140,8 @@ class OpcUaFaults : public ::testing::Test {
 
 TEST_F(OpcUaRun, ValuesOfEveryTypeArriveAndWritesConvertToTheVariablesType) {
     Host host(dir_, server().endpoint());
-    const char* names[] = {"Boolean", "SByte", "Byte",   "Int16",  "UInt16",        "Int32",
-                           "UInt32",  "Int64", "UInt64", "Float",  "Double",        "String",
+    const char* names[] = {"Boolean",       "SByte",    "Byte",       "Int16",   "UInt16", "Int32",
+                           "UInt32",        "Int64",    "UInt64",     "Float",   "Double", "String",
                            "LocalizedText", "DateTime", "Int32Array", "ReadOnly"};
     int handle = 1;
     for (const char* n : names) host.send("add Ua " + std::to_string(handle++) + " " + n);
@@ -146,9 +150,8 @@ TEST_F(OpcUaRun, ValuesOfEveryTypeArriveAndWritesConvertToTheVariablesType) {
     const std::string all = host.seen();
     for (const char* expected :
          {"1 = True", "2 = -5", "3 = 200", "4 = -1234", "5 = 60000", "6 = -100000",
-          "7 = 4000000000", "8 = 4294967298", "9 = 7", "10 = 1.5", "11 = 3.25",
-          "12 = \"Grüße\"", "13 = \"Hello\"", "14 = 1/2/2024 3:04:05 AM", "15 = (1, 2, 3, 4)",
-          "16 = 42"})
+          "7 = 4000000000", "8 = 4294967298", "9 = 7", "10 = 1.5", "11 = 3.25", "12 = \"Grüße\"",
+          "13 = \"Hello\"", "14 = 1/2/2024 3:04:05 AM", "15 = (1, 2, 3, 4)", "16 = 42"})
         EXPECT_NE(all.find(expected), std::string::npos) << expected << "\n" << all;
 
     // A read asks the server: the value comes back though it did not change.

@@ -71,7 +71,8 @@ TEST(UaVariantDecoding, ArraysAndMatricesBecomeZeroBasedArrays) {
     EXPECT_TRUE(d.array);
     EXPECT_EQ(d.value, Variant(VbArray<Variant>(0, {Variant(1), Variant(-2)})));
     // A 2x1 matrix: the elements in order, the dimensions skipped.
-    const DataValue m = variantOf(bytes({0xC3, 2, 0, 0, 0, 7, 8, 2, 0, 0, 0, 2, 0, 0, 0, 1, 0, 0, 0}));
+    const DataValue m =
+        variantOf(bytes({0xC3, 2, 0, 0, 0, 7, 8, 2, 0, 0, 0, 2, 0, 0, 0, 1, 0, 0, 0}));
     EXPECT_EQ(m.value, Variant(VbArray<Variant>(0, {Variant(int16_t{7}), Variant(int16_t{8})})));
 }
 
@@ -93,7 +94,8 @@ TEST(UaVariantDecoding, LengthsBeyondTheMessageFailBeforeAnythingIsAllocated) {
 
 TEST(UaDataValue, MaskSaysWhichPartsFollow) {
     // Mask 0x07: value (Int32 5), status BadNodeIdUnknown, source time stamp 1.
-    const std::string encoded = bytes({0x07, 6, 5, 0, 0, 0, 0, 0, 0x34, 0x80, 1, 0, 0, 0, 0, 0, 0, 0});
+    const std::string encoded =
+        bytes({0x07, 6, 5, 0, 0, 0, 0, 0, 0x34, 0x80, 1, 0, 0, 0, 0, 0, 0, 0});
     Reader r(encoded);
     DataValue d;
     DecodeDataValue(r, d);
@@ -152,9 +154,9 @@ struct NodeIdCase {
 
 TEST(UaNodeId, EachTextFormParsesAndEncodesInItsShortestForm) {
     const NodeIdCase cases[] = {
-        {"i=85", bytes({0, 85})},                                   // two-byte form
-        {"ns=2;i=1025", bytes({1, 2, 0x01, 0x04})},                 // four-byte form
-        {"ns=300;i=7", bytes({2, 0x2C, 0x01, 7, 0, 0, 0})},        // numeric form
+        {"i=85", bytes({0, 85})},                            // two-byte form
+        {"ns=2;i=1025", bytes({1, 2, 0x01, 0x04})},          // four-byte form
+        {"ns=300;i=7", bytes({2, 0x2C, 0x01, 7, 0, 0, 0})},  // numeric form
         {"i=70000", bytes({2, 0, 0, 0x70, 0x11, 0x01, 0})},
         {"ns=2;s=Line1.Level",
          bytes({3, 2, 0, 11, 0, 0, 0, 'L', 'i', 'n', 'e', '1', '.', 'L', 'e', 'v', 'e', 'l'})},
@@ -192,9 +194,9 @@ TEST(UaNodeId, NamespaceUrisAreKeptForTheServerToResolve) {
 
 TEST(UaNodeId, MalformedTextIsRefused) {
     NodeId id;
-    for (const char* bad : {"", "Line1.Level", "ns=2", "ns=;s=x", "ns=70000;i=1", "ns=2;s=",
-                            "i=", "i=12a", "i=4294967296", "ns=1;g=1234", "ns=1;b=A", "ns=1;x=1",
-                            "nsu=;s", "ns=-1;i=2"})
+    for (const char* bad :
+         {"", "Line1.Level", "ns=2", "ns=;s=x", "ns=70000;i=1", "ns=2;s=", "i=", "i=12a",
+          "i=4294967296", "ns=1;g=1234", "ns=1;b=A", "ns=1;x=1", "nsu=;s", "ns=-1;i=2"})
         EXPECT_FALSE(ParseNodeId(bad, id)) << bad;
 }
 
@@ -217,8 +219,8 @@ TEST(UaNodeId, ExpandedFormsCarryTheirNamespaceUri) {
 TEST(UaStructures, AReadRequestEncodesAsItsDescriptionSays) {
     std::vector<Value> v;
     AppendRequestHeader(v, NodeId{}, 0, 7, 2000);
-    v.emplace_back().real = 0;       // maxAge
-    v.emplace_back().number = 0;     // timestampsToReturn
+    v.emplace_back().real = 0;    // maxAge
+    v.emplace_back().number = 0;  // timestampsToReturn
     Value& len = v.emplace_back();
     len.isLength = true;
     len.count = 1;
@@ -230,20 +232,20 @@ TEST(UaStructures, AReadRequestEncodesAsItsDescriptionSays) {
     Writer w(out);
     Encode(w, msg::ReadRequest, v);
     const std::string expected =
-        bytes({0, 0,                        // authenticationToken i=0
-               0, 0, 0, 0, 0, 0, 0, 0,      // timestamp
-               7, 0, 0, 0,                  // requestHandle
-               0, 0, 0, 0,                  // returnDiagnostics
-               0xFF, 0xFF, 0xFF, 0xFF,      // auditEntryId null
-               0xD0, 0x07, 0, 0,            // timeoutHint 2000
-               0, 0, 0,                     // additionalHeader: i=0, no body
-               0, 0, 0, 0, 0, 0, 0, 0,      // maxAge
-               0, 0, 0, 0,                  // timestampsToReturn
-               1, 0, 0, 0,                  // one ReadValueId
-               1, 0, 0xCF, 0x08,            // i=2255
-               13, 0, 0, 0,                 // Value attribute
-               0xFF, 0xFF, 0xFF, 0xFF,      // indexRange null
-               0, 0, 0xFF, 0xFF, 0xFF, 0xFF});  // dataEncoding: ns 0, name null
+        bytes({0,    0,                                  // authenticationToken i=0
+               0,    0,    0,    0,    0,    0,   0, 0,  // timestamp
+               7,    0,    0,    0,                      // requestHandle
+               0,    0,    0,    0,                      // returnDiagnostics
+               0xFF, 0xFF, 0xFF, 0xFF,                   // auditEntryId null
+               0xD0, 0x07, 0,    0,                      // timeoutHint 2000
+               0,    0,    0,                            // additionalHeader: i=0, no body
+               0,    0,    0,    0,    0,    0,   0, 0,  // maxAge
+               0,    0,    0,    0,                      // timestampsToReturn
+               1,    0,    0,    0,                      // one ReadValueId
+               1,    0,    0xCF, 0x08,                   // i=2255
+               13,   0,    0,    0,                      // Value attribute
+               0xFF, 0xFF, 0xFF, 0xFF,                   // indexRange null
+               0,    0,    0xFF, 0xFF, 0xFF, 0xFF});     // dataEncoding: ns 0, name null
     EXPECT_EQ(out, expected);
     // And a ReadRequest's values decode back to the same leaves.
     Reader r(out);
@@ -255,16 +257,15 @@ TEST(UaStructures, AReadRequestEncodesAsItsDescriptionSays) {
 }
 
 TEST(UaStructures, AResponseWithAStringTableStillDecodesItsResults) {
-    const std::string body = bytes({
-        0, 0, 0, 0, 0, 0, 0, 0,   // timestamp
-        9, 0, 0, 0,               // requestHandle
-        0, 0, 0, 0,               // serviceResult Good
-        0,                        // serviceDiagnostics: empty mask
-        1, 0, 0, 0, 1, 0, 0, 0, 'x',  // stringTable ["x"]
-        0, 0, 0,                  // additionalHeader
-        1, 0, 0, 0,               // one result
-        0x01, 6, 42, 0, 0, 0,     // DataValue: Int32 42
-        0xFF, 0xFF, 0xFF, 0xFF}); // diagnosticInfos null
+    const std::string body = bytes({0,    0,    0,    0,   0, 0, 0, 0,  // timestamp
+                                    9,    0,    0,    0,                // requestHandle
+                                    0,    0,    0,    0,                // serviceResult Good
+                                    0,  // serviceDiagnostics: empty mask
+                                    1,    0,    0,    0,   1, 0, 0, 0, 'x',  // stringTable ["x"]
+                                    0,    0,    0,                           // additionalHeader
+                                    1,    0,    0,    0,                     // one result
+                                    0x01, 6,    42,   0,   0, 0,             // DataValue: Int32 42
+                                    0xFF, 0xFF, 0xFF, 0xFF});                // diagnosticInfos null
     Reader r(body);
     std::vector<Value> v;
     Decode(r, msg::ReadResponse, v);
@@ -307,7 +308,8 @@ TEST(UaChunkAssembly, ChunksOfAMessageAreJoinedWhateverTheStreamsSplit) {
 TEST(UaChunkAssembly, AnAbortChunkDropsTheMessageAndSaysWhy) {
     UaChunkAssembler a;
     std::vector<UaMessage> got;
-    a.feed(chunk("MSG", 'C', 3, "abc") + chunk("MSG", 'A', 3, bytes({0, 0, 0x80, 0x80, 0, 0, 0, 0})) +
+    a.feed(chunk("MSG", 'C', 3, "abc") +
+               chunk("MSG", 'A', 3, bytes({0, 0, 0x80, 0x80, 0, 0, 0, 0})) +
                chunk("MSG", 'F', 3, "new"),
            [&](const UaMessage& m) { got.push_back(m); });
     ASSERT_EQ(got.size(), 2u);
@@ -324,10 +326,10 @@ TEST(UaChunkAssembly, SizesBeyondTheNegotiatedLimitsEndTheConnection) {
     EXPECT_THROW(a.feed(bytes({'M', 'S', 'G', 'F', 0x01, 0x20, 0, 0}), ignore), DecodeError);
     a.reset();
     // More chunks than allowed.
-    EXPECT_THROW(a.feed(chunk("MSG", 'C', 1, "a") + chunk("MSG", 'C', 1, "b") +
-                            chunk("MSG", 'C', 1, "c"),
-                        ignore),
-                 DecodeError);
+    EXPECT_THROW(
+        a.feed(chunk("MSG", 'C', 1, "a") + chunk("MSG", 'C', 1, "b") + chunk("MSG", 'C', 1, "c"),
+               ignore),
+        DecodeError);
     a.reset();
     // A message larger than allowed.
     EXPECT_THROW(a.feed(chunk("MSG", 'F', 1, std::string(101, 'x')), ignore), DecodeError);
