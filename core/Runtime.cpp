@@ -7,6 +7,7 @@
 #include "lang/Strings.h"
 #include "platform/PollEventLoop.h"
 #include "platform/SystemClock.h"
+#include "platform/opcua/UaServerBackend.h"
 
 namespace maroset {
 
@@ -35,7 +36,13 @@ Runtime::Runtime(std::unique_ptr<platform::EventLoop> loop, std::unique_ptr<plat
       messageBox_([](const std::string& text) { std::cerr << text << std::endl; }),
       trap_(*clock_, files_, [this](const std::string& text) { MsgBox(text); }),
       serialDevices_(*loop_),
-      tcp_(*loop_) {}
+      tcp_(*loop_) {
+    // An OPC node whose server is an endpoint URL reaches that OPC UA server.
+    opcServers_.RegisterScheme("opc.tcp", [this](const std::string& url) {
+        return std::make_shared<platform::opcua::UaServerBackend>(*loop_, *clock_, tcp_, trace_,
+                                                                  url);
+    });
+}
 
 Runtime::~Runtime() {
     // Nodes shut their drivers down while the loop, files and trap are still here.

@@ -2,7 +2,12 @@
 
 #include <charconv>
 #include <cmath>
+#include <cstdio>
 #include <limits>
+#include <optional>
+
+#include "lang/Strings.h"
+#include "lang/VbError.h"
 
 namespace maroset {
 
@@ -74,6 +79,8 @@ double numericValue(const Variant& v) {
             return v.single();
         case VarType::Double:
             return v.dbl();
+        case VarType::Date:
+            return v.date();
         case VarType::Boolean:
             return v.boolean() ? -1.0 : 0.0;
         case VarType::String: {
@@ -85,6 +92,90 @@ double numericValue(const Variant& v) {
         default:
             throw VbError(err::TypeMismatch);
     }
+}
+
+// Days since 12/30/1899 from a civil date, and back (proleptic Gregorian calendar).
+int64_t daysFromCivil(int64_t y, unsigned m, unsigned d) {
+    y -= m <= 2;
+    const int64_t era = (y >= 0 ? y : y - 399) / 400;
+    const auto yoe = static_cast<unsigned>(y - era * 400);
+    const unsigned doy = (153 * (m > 2 ? m - 3 : m + 9) + 2) / 5 + d - 1;
+    const unsigned doe = yoe * 365 + yoe / 4 - yoe / 100 + doy;
+    return era * 146097 + static_cast<int64_t>(doe) - 719468 + 25569;
+}
+
+void civilFromDays(int64_t serial, int64_t& y, unsigned& m, unsigned& d) {
+    const int64_t z = serial - 25569 + 719468;
+    const int64_t era = (z >= 0 ? z : z - 146096) / 146097;
+    const auto doe = static_cast<unsigned>(z - era * 146097);
+    const unsigned yoe = (doe - doe / 1460 + doe / 36524 - doe / 146096) / 365;
+    const unsigned doy = doe - (365 * yoe + yoe / 4 - yoe / 100);
+    const unsigned mp = (5 * doy + 2) / 153;
+    d = doy - (153 * mp + 2) / 5 + 1;
+    m = mp < 10 ? mp + 3 : mp - 9;
+    y = static_cast<int64_t>(yoe) + era * 400 + (m <= 2);
+}
+
+// "M/D/YYYY h:mm:ss AM/PM"; the date alone at midnight, the time alone on day 0.
+std::string dateText(double serial) {
+    if (!std::isfinite(serial)) throw VbError(err::Overflow);
+    const double whole = std::trunc(serial);
+    // The fraction counts the time forward even for dates before day 0.
+    auto seconds = static_cast<int64_t>(std::llround(std::fabs(serial - whole) * 86400.0));
+    auto day = static_cast<int64_t>(whole);
+    if (seconds >= 86400) {
+        seconds -= 86400;
+        day += serial < 0 ? -1 : 1;
+    }
+    char buf[64];
+    std::string text;
+    if (day != 0 || seconds == 0) {
+        int64_t y;
+        unsigned m, d;
+        civilFromDays(day, y, m, d);
+        std::snprintf(buf, sizeof buf, "%u/%u/%lld", m, d, static_cast<long long>(y));
+        text = buf;
+    }
+    if (seconds != 0) {
+        const auto h = static_cast<int>(seconds / 3600);
+        std::snprintf(buf, sizeof buf, "%d:%02d:%02d %s", h % 12 == 0 ? 12 : h % 12,
+                      static_cast<int>(seconds / 60 % 60), static_cast<int>(seconds % 60),
+                      h < 12 ? "AM" : "PM");
+        if (!text.empty()) text += ' ';
+        text += buf;
+    }
+    return text;
+}
+
+// The Date's own text form back to a serial; nothing for other text.
+std::optional<double> parseDate(std::string_view text) {
+    std::string s(trimBlanks(text));
+    unsigned m = 0, d = 0, h = 0, mi = 0, sec = 0;
+    long long y = 0;
+    char ampm[3] = {};
+    int used = 0;
+    double serial = 0;
+    bool any = false;
+    if (std::sscanf(s.c_str(), "%u/%u/%lld%n", &m, &d, &y, &used) == 3) {
+        if (m < 1 || m > 12 || d < 1 || d > 31 || y < 100 || y > 9999) return std::nullopt;
+        serial = static_cast<double>(daysFromCivil(y, m, d));
+        s.erase(0, static_cast<size_t>(used));
+        s = std::string(trimBlanks(s));
+        any = true;
+    }
+    if (!s.empty()) {
+        if (std::sscanf(s.c_str(), "%u:%u:%u %2s%n", &h, &mi, &sec, ampm, &used) != 4 ||
+            static_cast<size_t>(used) != s.size() || h < 1 || h > 12 || mi > 59 || sec > 59)
+            return std::nullopt;
+        const std::string half = UCase(ampm);
+        if (half != "AM" && half != "PM") return std::nullopt;
+        h = h % 12 + (half == "PM" ? 12 : 0);
+        const double time = (h * 3600.0 + mi * 60.0 + sec) / 86400.0;
+        serial = serial < 0 ? serial - time : serial + time;
+        any = true;
+    }
+    if (!any) return std::nullopt;
+    return serial;
 }
 
 // Round half to even, then check the range of the target.
@@ -257,6 +348,8 @@ std::string CStr(const Variant& v) {
             return formatG(v.single(), 7);
         case VarType::Double:
             return formatG(v.dbl(), 15);
+        case VarType::Date:
+            return dateText(v.date());
         case VarType::String:
             return v.string();
         case VarType::Boolean:
@@ -264,6 +357,17 @@ std::string CStr(const Variant& v) {
         default:
             throw VbError(err::TypeMismatch);
     }
+}
+
+double CDate(const Variant& v) {
+    if (v.type() == VarType::Date) return v.date();
+    if (v.isString()) {
+        if (const auto serial = parseDate(v.string())) return *serial;
+    }
+    const double d = numericValue(v);
+    // The language's dates run from year 100 to year 9999.
+    if (!std::isfinite(d) || d < -657434.0 || d >= 2958466.0) throw VbError(err::Overflow);
+    return d;
 }
 
 bool CBool(const Variant& v) {

@@ -21,8 +21,12 @@ int32_t CLng(const Variant& v);
 float CSng(const Variant& v);
 double CDbl(const Variant& v);
 // Single: at most 7 significant digits; Double: at most 15; Boolean: "True" / "False";
-// large and small magnitudes in the E notation ("1E+20", "1.5E-05").
+// large and small magnitudes in the E notation ("1E+20", "1.5E-05"); Date: "M/D/YYYY
+// h:mm:ss AM/PM", the date alone at midnight and the time alone on 12/30/1899.
 std::string CStr(const Variant& v);
+// A date serial (see Variant::FromDate): a Date as it is, a number as the serial it is, text
+// as a number or in the Date's text form ("M/D/YYYY", "h:mm:ss AM/PM" or both).
+double CDate(const Variant& v);
 // Numbers: non-zero is True; text: "True" / "False" in any letter case, or a number.
 bool CBool(const Variant& v);
 

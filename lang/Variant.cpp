@@ -19,7 +19,8 @@ enum Index : size_t {
     kString,
     kBoolean,
     kArray,
-    kObject
+    kObject,
+    kDate
 };
 
 [[noreturn]] void typeMismatch() {
@@ -30,6 +31,12 @@ enum Index : size_t {
 Variant Variant::Null() noexcept {
     Variant v;
     v.value_.emplace<NullValue>();
+    return v;
+}
+
+Variant Variant::FromDate(double days) noexcept {
+    Variant v;
+    v.value_.emplace<DateValue>(DateValue{days});
     return v;
 }
 
@@ -45,6 +52,8 @@ VarType Variant::type() const noexcept {
             return VarType::Single;
         case kDouble:
             return VarType::Double;
+        case kDate:
+            return VarType::Date;
         case kString:
             return VarType::String;
         case kBoolean:
@@ -70,6 +79,8 @@ std::string Variant::typeName() const {
             return "Single";
         case kDouble:
             return "Double";
+        case kDate:
+            return "Date";
         case kString:
             return "String";
         case kBoolean:
@@ -108,6 +119,10 @@ float Variant::single() const {
 }
 double Variant::dbl() const {
     if (auto p = std::get_if<double>(&value_)) return *p;
+    typeMismatch();
+}
+double Variant::date() const {
+    if (auto p = std::get_if<DateValue>(&value_)) return p->days;
     typeMismatch();
 }
 bool Variant::boolean() const {

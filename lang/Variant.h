@@ -20,6 +20,7 @@ enum class VarType : uint16_t {
     Long = 3,     // 32-bit
     Single = 4,
     Double = 5,
+    Date = 7,    // days since 12/30/1899, the time of day as the fraction
     String = 8,  // bytes, Latin-1
     Object = 9,
     Boolean = 11,
@@ -48,10 +49,13 @@ class Variant {
     Variant(std::shared_ptr<Object> v) noexcept : value_(std::move(v)) {}
 
     static Variant Null() noexcept;
+    // A Date: days since 12/30/1899 (the language's date serial), the time of day as the
+    // fraction; before that day the whole days count down and the fraction still counts up.
+    static Variant FromDate(double days) noexcept;
 
     VarType type() const noexcept;
     // The language's TypeName: "Empty", "Null", "Integer", "Long", "Single", "Double",
-    // "String", "Boolean", "Variant()", or "Object".
+    // "Date", "String", "Boolean", "Variant()", or "Object".
     std::string typeName() const;
 
     bool isEmpty() const noexcept { return value_.index() == 0; }
@@ -66,6 +70,8 @@ class Variant {
     int32_t lng() const;
     float single() const;
     double dbl() const;
+    // The date serial of a Date.
+    double date() const;
     bool boolean() const;
     const std::string& string() const;
     const VbArray<Variant>& array() const;
@@ -80,9 +86,13 @@ class Variant {
     struct NullValue {
         friend bool operator==(NullValue, NullValue) { return true; }
     };
+    struct DateValue {
+        double days;
+        friend bool operator==(DateValue, DateValue) = default;
+    };
     using Storage =
         std::variant<std::monostate, NullValue, int16_t, int32_t, float, double, std::string, bool,
-                     std::shared_ptr<VbArray<Variant>>, std::shared_ptr<Object>>;
+                     std::shared_ptr<VbArray<Variant>>, std::shared_ptr<Object>, DateValue>;
     Storage value_;
 };
 

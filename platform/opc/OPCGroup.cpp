@@ -57,6 +57,7 @@ void OPCGroup::requireLive(const char* what) const {
 }
 
 void OPCGroup::rearm() {
+    if (connection_) items_.scan(OpcScan{active_, updateRate_, name_});
     const bool on = connection_ && active_ && subscribed_;
     if (on) timer_.Interval(updateRate_);
     timer_.Enabled(on);
@@ -138,9 +139,14 @@ void OPCGroup::AsyncRead(int32_t NumItems, const VbArray<int32_t>& ServerHandles
     Errors = std::move(errors);
     CancelID = nextCancelID_++;
     if (request->items.empty()) return;
-    connection_->loop.post([weak = weak_from_this(), request] {
+    auto complete = [weak = weak_from_this(), request] {
         if (auto self = weak.lock()) self->completeRead(*request);
-    });
+    };
+    // A server that reads from its device answers once it has; the others at the next turn.
+    std::vector<std::shared_ptr<OpcItemSource>> sources;
+    for (const auto& [serverHandle, clientHandle] : request->items)
+        sources.push_back(items_.find(serverHandle)->source);
+    if (!connection_->backend->Refresh(sources, complete)) connection_->loop.post(complete);
 }
 
 void OPCGroup::completeRead(const ReadRequest& request) {

@@ -69,8 +69,9 @@ class OPCGroup : public std::enable_shared_from_this<OPCGroup> {
 
     // Reads NumItems items by server handle; Errors (re-dimensioned 1 to NumItems) holds S_OK
     // or OPC_E_INVALIDHANDLE for each. The values of the accepted items come with one
-    // AsyncReadComplete; none comes when no item was accepted. CancelID identifies the
-    // request.
+    // AsyncReadComplete, once a server that reads from its device has read them (an OPC UA
+    // server: one Read), otherwise at the next turn of the loop; none comes when no item was
+    // accepted. CancelID identifies the request.
     void AsyncRead(int32_t NumItems, const VbArray<int32_t>& ServerHandles,
                    VbArray<int32_t>& Errors, int32_t TransactionID, int32_t& CancelID);
     // Writes Values(i) to the item of ServerHandles(i). An unknown handle

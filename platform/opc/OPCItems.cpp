@@ -51,6 +51,7 @@ void OPCItems::AddItems(int32_t NumItems, const VbArray<std::string>& ItemIDs,
         byHandle_[e.serverHandle] = entries_.size();
         entries_.push_back(std::move(e));
         ++live_;
+        entries_.back().source->Scan(scan_);
         handles(i) = entries_.back().serverHandle;
         errors(i) = hr;
     }
@@ -81,6 +82,13 @@ void OPCItems::Remove(int32_t NumItems, const VbArray<int32_t>& ServerHandles,
     }
     Errors = std::move(errors);
     compact();
+}
+
+void OPCItems::scan(const OpcScan& scan) {
+    scan_ = scan;
+    for (Entry& e : entries_) {
+        if (e.source) e.source->Scan(scan_);
+    }
 }
 
 OPCItems::Entry* OPCItems::find(int32_t serverHandle) {

@@ -8,6 +8,7 @@
 
 #include "lang/Variant.h"
 #include "lang/VbArray.h"
+#include "platform/opc/OpcItemSource.h"
 
 namespace maroset::platform {
 
@@ -53,6 +54,8 @@ class OPCItems {
   private:
     friend class OPCGroup;
     void attach(std::shared_ptr<OpcConnection> connection);
+    // The group's scan, handed to every item now and to each item added later.
+    void scan(const OpcScan& scan);
     // The live item of a server handle; null when there is none.
     Entry* find(int32_t serverHandle);
     // Every live item, in the order they were added.
@@ -69,6 +72,7 @@ class OPCItems {
     std::unordered_map<int32_t, size_t> byHandle_;  // dropped in batches
     int32_t live_ = 0;
     int32_t nextHandle_ = 1;
+    OpcScan scan_;
 };
 
 }  // namespace maroset::platform

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <string>
 
 #include "lang/Variant.h"
 #include "platform/Clock.h"
@@ -13,6 +14,14 @@ struct OpcItemState {
     Variant value;
     int32_t quality = 0;
     DateTime timeStamp{};
+};
+
+// How the group that holds an item scans it: whether the group is active, its update rate,
+// and its name (a driver names its group after its node).
+struct OpcScan {
+    bool active = false;
+    int32_t updateRate = 0;
+    std::string group;
 };
 
 // One item of a server's address space, as one group of one client holds it (what
@@ -29,6 +38,10 @@ class OpcItemSource {
     // Writes a value to the item; the result code of the write (S_OK, OPC_E_BADTYPE,
     // OPC_E_RANGE, ...).
     virtual int32_t Write(const Variant& value) = 0;
+    // The group's scan, once the item is added and whenever it changes. A server whose
+    // values come by subscription (an OPC UA server) subscribes at this rate while active;
+    // one that is read on demand ignores it.
+    virtual void Scan(const OpcScan&) {}
 };
 
 }  // namespace maroset::platform

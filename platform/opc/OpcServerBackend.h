@@ -1,9 +1,11 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "platform/opc/OpcItemSource.h"
 
@@ -29,6 +31,15 @@ class OpcServerBackend {
     // Resolves an item ID for a group that adds it: S_OK and the item, or the result code
     // that refuses it (OPC_E_UNKNOWNITEMID, OPC_E_INVALIDITEMID, ...) and no item.
     virtual int32_t AddItem(const std::string& itemID, std::shared_ptr<OpcItemSource>& item) = 0;
+
+    // Reads items afresh from the device for an asynchronous read, and calls done on the
+    // loop once their states are current (or the device did not answer): true when it
+    // does. False (the default) leaves the read to the states the items hold, at the next
+    // turn of the loop.
+    virtual bool Refresh(const std::vector<std::shared_ptr<OpcItemSource>>&,
+                         std::function<void()>) {
+        return false;
+    }
 
     // The server's text for one of its own result codes, with the message table's CR LF at
     // the end; nothing leaves it to the standard texts.

@@ -22,8 +22,19 @@ bool OpcServerRegistry::Unregister(const std::string& progID) {
 }
 
 std::shared_ptr<OpcServerBackend> OpcServerRegistry::Find(const std::string& progID) const {
-    const auto it = servers_.find(UCase(progID));
-    return it == servers_.end() ? nullptr : it->second.second;
+    const std::string key = UCase(progID);
+    if (const auto it = servers_.find(key); it != servers_.end()) return it->second.second;
+    const size_t colon = key.find("://");
+    if (colon == std::string::npos) return nullptr;
+    const auto scheme = schemes_.find(key.substr(0, colon));
+    if (scheme == schemes_.end()) return nullptr;
+    auto& backend = made_[key];
+    if (!backend) backend = scheme->second(progID);
+    return backend;
+}
+
+void OpcServerRegistry::RegisterScheme(const std::string& scheme, Factory make) {
+    schemes_[UCase(scheme)] = std::move(make);
 }
 
 std::vector<std::string> OpcServerRegistry::ProgIDs() const {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <string>
@@ -38,6 +39,11 @@ class OpcServerRegistry {
     bool Unregister(const std::string& progID);
     // The server of an identifier; null when none is registered.
     std::shared_ptr<OpcServerBackend> Find(const std::string& progID) const;
+    // Identifiers "SCHEME://..." (the scheme in any letter case) that are not registered
+    // themselves are served by the backend `make` gives for each distinct identifier, made
+    // on first use and kept: an OPC UA server is named by its endpoint URL ("opc.tcp://...").
+    using Factory = std::function<std::shared_ptr<OpcServerBackend>(const std::string& progID)>;
+    void RegisterScheme(const std::string& scheme, Factory make);
     // Every registered identifier as it was registered, ordered by identifier (letter case
     // ignored).
     std::vector<std::string> ProgIDs() const;
@@ -50,6 +56,9 @@ class OpcServerRegistry {
     const Clock& clock_;
     // Keyed by the upper-cased identifier.
     std::map<std::string, std::pair<std::string, std::shared_ptr<OpcServerBackend>>> servers_;
+    // Keyed by the upper-cased scheme; the backends made, by upper-cased identifier.
+    std::map<std::string, Factory> schemes_;
+    mutable std::map<std::string, std::shared_ptr<OpcServerBackend>> made_;
 };
 
 }  // namespace maroset::platform

@@ -118,6 +118,40 @@ TEST(TextConversion, SingleShowsSevenDigitsDoubleFifteen) {
 
 // Numbers compare by value (True is -1, a Single is widened, not rounded) and below any text;
 // text compares by its bytes, unsigned; Empty is 0 or ""; Null makes the result Null.
+TEST(DateConversion, TheTextFormShowsDateTimeOrBoth) {
+    EXPECT_EQ(CStr(Variant::FromDate(45293.0)), "1/2/2024");
+    EXPECT_EQ(CStr(Variant::FromDate(45293.5)), "1/2/2024 12:00:00 PM");
+    EXPECT_EQ(CStr(Variant::FromDate(45293.0 + 3.0 / 24 + 4.0 / 1440 + 5.0 / 86400)),
+              "1/2/2024 3:04:05 AM");
+    // Day 0 alone is the time of day; midnight of day 0 is the day.
+    EXPECT_EQ(CStr(Variant::FromDate(0.75)), "6:00:00 PM");
+    EXPECT_EQ(CStr(Variant::FromDate(0.0)), "12/30/1899");
+    // Before day 0 the days count down and the time still counts up.
+    EXPECT_EQ(CStr(Variant::FromDate(-1.25)), "12/29/1899 6:00:00 AM");
+    // A time that rounds to the next day's midnight shows that day.
+    EXPECT_EQ(CStr(Variant::FromDate(45293.9999999)), "1/3/2024");
+}
+
+TEST(DateConversion, DatesAreTheirSerialAsNumbersAndTextReadsBack) {
+    const Variant d = Variant::FromDate(45293.5);
+    EXPECT_EQ(d.type(), VarType::Date);
+    EXPECT_EQ(d.typeName(), "Date");
+    EXPECT_DOUBLE_EQ(CDbl(d), 45293.5);
+    EXPECT_EQ(CLng(d), 45294);  // half to even
+    EXPECT_TRUE(CBool(d));
+    EXPECT_FALSE(IsNumeric(d));
+    EXPECT_EQ(Compare(d, Variant(45293.5)), Ordering::Equal);
+    EXPECT_DOUBLE_EQ(CDate(Variant("1/2/2024 12:00:00 PM")), 45293.5);
+    EXPECT_DOUBLE_EQ(CDate(Variant("6:00:00 PM")), 0.75);
+    EXPECT_DOUBLE_EQ(CDate(Variant(" 12/30/1899 ")), 0.0);
+    EXPECT_DOUBLE_EQ(CDate(Variant(10)), 10.0);
+    EXPECT_DOUBLE_EQ(CDate(Variant("10.5")), 10.5);
+    EXPECT_EQ(errorOf([] { CDate(Variant("13/1/2024")); }), err::TypeMismatch);
+    EXPECT_EQ(errorOf([] { CDate(Variant("1/2/2024 13:00:00 PM")); }), err::TypeMismatch);
+    EXPECT_EQ(errorOf([] { CDate(Variant(3e6)); }), err::Overflow);
+    EXPECT_EQ(errorOf([] { CDate(kNull); }), err::InvalidUseOfNull);
+}
+
 TEST(VariantComparison, NumbersByValueTextByBytesEmptyAndNull) {
     using enum Ordering;
     const Variant e;

@@ -8,7 +8,7 @@
 #include <thread>
 #include <vector>
 
-#include "ChildProcess.h"
+#include "support/ChildProcess.h"
 #include "sim/wago/WagoCouplerSimulator.h"
 
 namespace maroset::platform {

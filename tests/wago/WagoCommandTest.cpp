@@ -7,7 +7,7 @@
 #include <array>
 #include <regex>
 
-#include "ChildProcess.h"
+#include "support/ChildProcess.h"
 #include "platform/mbt/MbtLibrary.h"
 
 namespace maroset::test {
