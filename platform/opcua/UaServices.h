@@ -5,7 +5,7 @@
 namespace maroset::platform::opcua {
 
 // The messages this client exchanges, as descriptions the generic encoder and decoder walk
-// (member lists as the OPC UA specification's Part 4 and Part 6 give them). A request's
+// (member lists as OPC 10000-4, Services, and OPC 10000-6, Mappings, give them). A request's
 // values start with its RequestHeader's, a response's with its ResponseHeader's.
 namespace msg {
 extern const StructType RequestHeader;

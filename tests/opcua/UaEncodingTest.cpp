@@ -9,7 +9,7 @@
 #include "platform/opcua/UaChunks.h"
 #include "platform/opcua/UaServices.h"
 
-// Byte vectors worked out by hand from the OPC UA binary encoding (Part 6, 5.2): every
+// Byte vectors worked out by hand from the OPC UA binary encoding (OPC 10000-6, 5.2): every
 // integer little-endian, strings as an Int32 length and the bytes, arrays as an Int32 count.
 
 namespace maroset::platform::opcua {
