@@ -6,6 +6,7 @@ const TREND_SECONDS = 300;
 const TREND_POINTS = 300;   // per tag; a tag that changes faster shows a shorter window
 const ERRORS_KEPT = 50;
 const NODES_REFRESH_MS = 5000;
+const LIT_MS = 1000;         // how long a changed value stays highlighted
 
 const $ = (id) => document.getElementById(id);
 const keyOf = (node, handle) => node + '\u0000' + handle;
@@ -13,6 +14,8 @@ const keyOf = (node, handle) => node + '\u0000' + handle;
 const rows = new Map();      // tag key -> row record, in table order
 const pending = new Map();   // tag key -> latest {value, time} not yet on screen
 const nodes = new Map();     // node name -> its list element
+const lit = new Map();       // row record -> when its highlight goes out
+let putOutTimer = 0;
 let frameRequested = false;
 let tagsLoaded = false;
 let selected = null;         // row record shown in the trend
@@ -35,10 +38,17 @@ function shown(value) {
   return String(value);
 }
 
+// A batch of changes shares one time, and formatting it is the dearest part of a row.
+let clockIso = '';
+let clockText = '';
 function clock(iso) {
   if (!iso) return '';
-  const t = new Date(iso);
-  return isNaN(t) ? iso : t.toLocaleTimeString();
+  if (iso !== clockIso) {
+    const t = new Date(iso);
+    clockIso = iso;
+    clockText = isNaN(t) ? iso : t.toLocaleTimeString();
+  }
+  return clockText;
 }
 
 function numeric(value) {
@@ -87,29 +97,38 @@ async function refreshNodes() {
 
 // ---- tags -----------------------------------------------------------------------------
 
+function cell(content, className) {
+  const el = text('span', content, className);
+  el.setAttribute('role', 'cell');
+  return el;
+}
+
+// Rows are grids of their own rather than a table's, so a changed value lays out its row
+// alone, and rows out of sight are skipped by the browser altogether.
 function buildRow(tag) {
-  const tr = document.createElement('tr');
+  const tr = document.createElement('div');
+  tr.className = 'row';
+  tr.setAttribute('role', 'row');
   tr.dataset.node = tag.node;
   tr.dataset.handle = tag.handle;
-  const name = text('td');
-  name.append(text('span', tag.name || tag.address),
+  const name = cell(undefined, 'name');
+  name.append(text('span', tag.node, 'muted node-inline'), text('span', tag.name || tag.address),
               tag.name && tag.name !== tag.address ? text('span', tag.address, 'muted addr') : '');
-  const value = text('td', shown(tag.value), 'num value');
+  const value = cell(shown(tag.value), 'num value');
   value.dataset.role = 'value';
-  const time = text('td', clock(tag.time), 'time');
-  const changes = text('td', String(tag.changes || 0), 'opt num');
-  const form = document.createElement('form');
-  form.className = 'write';
+  const time = cell(clock(tag.time), 'time');
+  const changes = cell(String(tag.changes || 0), 'opt num');
+  // No <form> per row: Chromium takes time quadratic in their number to build ten thousand.
+  const box = text('div', undefined, 'write');
   const input = document.createElement('input');
-  input.name = 'value';
   input.setAttribute('aria-label', 'new value of ' + (tag.name || tag.address));
-  form.append(input, text('button', 'Set'));
-  const writeCell = text('td', undefined, 'write-col');
-  writeCell.append(form);
-  tr.append(text('td', tag.node), name, value, text('td', tag.type || '', 'opt type'), time,
+  box.append(input, text('button', 'Set'));
+  const writeCell = cell(undefined, 'write-col');
+  writeCell.append(box);
+  tr.append(cell(tag.node, 'node-col'), name, value, cell(tag.type || '', 'opt type'), time,
             changes, writeCell);
   const row = {
-    tag, tr, value, time, changes, flash: false,
+    tag, tr, value, time, changes,
     search: (tag.node + ' ' + tag.name + ' ' + tag.address).toLowerCase(),
     trend: null, trendAt: 0, trendSize: 0,
   };
@@ -146,16 +165,31 @@ function loadTags(list) {
   schedule();
 }
 
-function show(row, value, time, changes, flash) {
+function show(row, value, time, changes, highlight) {
   row.tag.value = value;
   row.tag.time = time;
   row.value.textContent = shown(value);
   row.time.textContent = clock(time);
   row.changes.textContent = String(changes);
-  if (flash) {
-    // Two animations taking turns restart the highlight without forcing a layout.
-    row.flash = !row.flash;
-    row.value.className = 'num value ' + (row.flash ? 'flash-a' : 'flash-b');
+  if (highlight) {
+    // A plain class rather than an animation: thousands of cells animating at once cost
+    // far more than lighting them and putting them out a second later.
+    lit.delete(row);
+    lit.set(row, performance.now() + LIT_MS);
+    row.value.classList.add('lit');
+  }
+}
+
+// Puts out the cells lit longest ago; the map keeps them in the order they were lit.
+function putOut() {
+  const now = performance.now();
+  for (const [row, until] of lit) {
+    if (until > now) {
+      if (!putOutTimer) putOutTimer = setTimeout(() => { putOutTimer = 0; schedule(); }, until - now);
+      return;
+    }
+    row.value.classList.remove('lit');
+    lit.delete(row);
   }
 }
 
@@ -203,6 +237,7 @@ function frame() {
     }
     pending.clear();
   }
+  putOut();
   if (trendDirty) drawTrend();
 }
 
@@ -371,17 +406,19 @@ function start() {
     sessionStorage.setItem('maroset-token', token);
   });
   $('token').addEventListener('submit', (e) => e.preventDefault());
-  $('tags').addEventListener('submit', (e) => {
-    e.preventDefault();
-    const tr = e.target.closest('tr');
-    const row = rows.get(keyOf(tr.dataset.node, tr.dataset.handle));
-    if (row) write(row, e.target.elements.value);
+  const rowOf = (el) => {
+    const tr = el.closest('.row');
+    return tr && rows.get(keyOf(tr.dataset.node, tr.dataset.handle));
+  };
+  $('tags').addEventListener('keydown', (e) => {
+    const row = e.key === 'Enter' && e.target.tagName === 'INPUT' && rowOf(e.target);
+    if (row) write(row, e.target);
   });
   $('tags').addEventListener('click', (e) => {
-    if (e.target.closest('form')) return;
-    const tr = e.target.closest('tr');
-    const row = tr && rows.get(keyOf(tr.dataset.node, tr.dataset.handle));
-    if (row && row.trend) select(row);
+    const row = rowOf(e.target);
+    if (!row) return;
+    if (e.target.tagName === 'BUTTON') write(row, e.target.previousElementSibling);
+    else if (!e.target.closest('.write') && row.trend) select(row);
   });
   getJson('/api/info')
       .then((info) => setWrites(info.writes ? 'yes' : 'no', info.writes && info.token))
