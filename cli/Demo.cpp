@@ -14,6 +14,7 @@
 #include "cli/MemoryTagStation.h"
 #include "cli/OpcStation.h"
 #include "cli/ProjectDatabase.h"
+#include "cli/ServeCommand.h"
 #include "cli/SoftPlcStation.h"
 #include "cli/StopSignal.h"
 #include "cli/UsageError.h"
@@ -27,7 +28,7 @@
 namespace maroset::cli {
 
 const char* const Demo::Usage =
-    "usage: maroset demo [--seconds N] [--json]\n"
+    "usage: maroset demo [--seconds N] [--json] [--http [ADDR:PORT]]\n"
     "\n"
     "Builds a demo project in a temporary drive root, starts it, and shows its value\n"
     "changes live for N seconds (default 10); then stops and removes the drive root.\n"
@@ -35,7 +36,9 @@ const char* const Demo::Usage =
     "\n"
     "Options:\n"
     "  --seconds N   how long to run (1 to 86400)\n"
-    "  --json        events as JSON lines on standard output, narration on standard error\n";
+    "  --json        events as JSON lines on standard output, narration on standard error\n"
+    "  --http [ADDR:PORT]  serve the live page and API while it runs (default\n"
+    "                127.0.0.1:8080; port 0 picks a free one)\n";
 
 namespace {
 
@@ -72,9 +75,21 @@ std::vector<std::unique_ptr<DemoStation>> Demo::Stations() {
     return stations;
 }
 
-int Demo::Main(const std::vector<std::string>& args) {
-    CommandLine cl({{"seconds", true}, {"json"}});
+int Demo::Main(const std::vector<std::string>& given) {
+    // --http takes its address only when one follows it.
+    std::vector<std::string> args;
+    for (size_t i = 0; i < given.size(); ++i) {
+        if (given[i] != "--http") {
+            args.push_back(given[i]);
+        } else if (i + 1 < given.size() && given[i + 1].find(':') != std::string::npos) {
+            args.push_back("--http=" + given[++i]);
+        } else {
+            args.push_back("--http=127.0.0.1:8080");
+        }
+    }
+    CommandLine cl({{"seconds", true}, {"json"}, {"http", true}});
     int32_t seconds = 10;
+    std::optional<gateway::WebService::Settings> web;
     try {
         cl.parse(args);
         if (cl.help()) {
@@ -83,12 +98,17 @@ int Demo::Main(const std::vector<std::string>& args) {
         }
         cl.requireOperands(0, 0);
         if (auto n = cl.integer("seconds", 1, 86400)) seconds = *n;
+        if (auto listen = cl.value("http")) {
+            web.emplace().allowWrites = true;
+            ServeCommand::ParseListen(*listen, *web);
+        }
     } catch (const UsageError& e) {
         std::cerr << "maroset demo: " << e.what() << "\n" << Usage;
         return 2;
     }
     const bool json = cl.has("json");
     Demo demo(seconds, json, std::cout, json ? std::cerr : std::cout);
+    if (web) demo.serve(*web);
     return demo.run();
 }
 
@@ -162,8 +182,14 @@ void Demo::runProject(const std::filesystem::path& root) {
 
     for (auto& s : stations_) s->startSimulator();
     db.AddAllNodes(project.string());
-    for (auto& s : stations_) s->addTags(db, printer);
+    DemoStation::DemoTags tags;
+    for (auto& s : stations_) s->addTags(db, printer, tags);
     db.StartScanning();
+    std::optional<gateway::WebService> service;
+    if (web_) {
+        service.emplace(db, tags, *web_);
+        narration_ << "Live page on " << service->url() << std::endl;
+    }
     for (auto& s : stations_) s->tick(db, 0);
 
     int32_t second = 0;

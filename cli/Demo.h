@@ -3,11 +3,13 @@
 #include <cstdint>
 #include <filesystem>
 #include <memory>
+#include <optional>
 #include <ostream>
 #include <string>
 #include <vector>
 
 #include "cli/DemoStation.h"
+#include "gateway/WebService.h"
 
 namespace maroset::cli {
 
@@ -28,6 +30,8 @@ class Demo {
     static std::vector<std::unique_ptr<DemoStation>> Stations();
 
     Demo(int32_t seconds, bool json, std::ostream& out, std::ostream& narration);
+    // Serves the demo's page and API while it runs (writes allowed on loopback).
+    void serve(const gateway::WebService::Settings& web) { web_ = web; }
     int run();
 
   private:
@@ -38,6 +42,7 @@ class Demo {
     std::ostream& out_;
     std::ostream& narration_;
     std::vector<std::unique_ptr<DemoStation>> stations_;
+    std::optional<gateway::WebService::Settings> web_;
 };
 
 }  // namespace maroset::cli

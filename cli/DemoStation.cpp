@@ -13,12 +13,13 @@ std::shared_ptr<node> DemoStation::demoNode(nodeDB& db, const char* name) {
     return n;
 }
 
-void DemoStation::addDemoTags(nodeDB& db, EventPrinter& printer, const char* name,
-                              std::initializer_list<DemoTag> tags) {
+void DemoStation::addDemoTags(nodeDB& db, EventPrinter& printer, DemoTags& registered,
+                              const char* name, std::initializer_list<DemoTag> tags) {
     const auto n = demoNode(db, name);
     for (const DemoTag& t : tags) {
         n->AddTag(t.handle, t.address);
         printer.label(t.handle, std::string(name) + "." + t.address);
+        registered.push_back({name, t.handle, t.address, t.address});
     }
 }
 

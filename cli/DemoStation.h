@@ -5,6 +5,9 @@
 #include <initializer_list>
 #include <memory>
 #include <string>
+#include <vector>
+
+#include "gateway/TagTable.h"
 
 namespace maroset {
 class node;
@@ -29,8 +32,12 @@ class DemoStation {
     virtual void addNodes(const std::filesystem::path& project) = 0;
     // Starts the simulator its node talks to, before the project is loaded.
     virtual void startSimulator() {}
-    // Registers its tags, and names them for readable output (EventPrinter::label).
-    virtual void addTags(nodeDB& db, EventPrinter& printer) = 0;
+    // The tags registered, as a Tags table would list them (the demo's page shows them).
+    using DemoTags = std::vector<gateway::TagTable::Row>;
+
+    // Registers its tags, names them for readable output (EventPrinter::label) and lists them
+    // in registered.
+    virtual void addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) = 0;
     // Called at the start (second 0) and then once a second: makes values change.
     virtual void tick(nodeDB& db, int32_t second) = 0;
     // Stops the simulator, after the nodes are gone.
@@ -45,8 +52,8 @@ class DemoStation {
     // The station's node in the loaded project (Object variable not set if it is missing).
     static std::shared_ptr<node> demoNode(nodeDB& db, const char* name);
     // Adds the tags to the station's node, each shown as "<node>.<address>" in readable output.
-    static void addDemoTags(nodeDB& db, EventPrinter& printer, const char* name,
-                            std::initializer_list<DemoTag> tags);
+    static void addDemoTags(nodeDB& db, EventPrinter& printer, DemoTags& registered,
+                            const char* name, std::initializer_list<DemoTag> tags);
 };
 
 }  // namespace maroset::cli

@@ -27,8 +27,8 @@ void Df1Station::startSimulator() {
     rt.mapSerialPort(1, plc_->endpoint(), kNode);
 }
 
-void Df1Station::addTags(nodeDB& db, EventPrinter& printer) {
-    addDemoTags(db, printer, kNode,
+void Df1Station::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
+    addDemoTags(db, printer, registered, kNode,
                 {{CounterHandle, "N7:0"},
                  {LevelHandle, "N7:1"},
                  {PatternHandle, "N7:2"},

@@ -24,7 +24,7 @@ class Df1Station : public DemoStation {
     std::string title() const override { return "a DF1 PLC"; }
     void addNodes(const std::filesystem::path& project) override;
     void startSimulator() override;
-    void addTags(nodeDB& db, EventPrinter& printer) override;
+    void addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) override;
     void tick(nodeDB& db, int32_t second) override;
     void stopSimulator() override;
 

@@ -15,8 +15,8 @@ void DiskTagStation::addNodes(const std::filesystem::path& project) {
     ProjectDatabase::AddNode(project, {{"Name", Variant(kNode)}, {"Driver", Variant("DISKTAG")}});
 }
 
-void DiskTagStation::addTags(nodeDB& db, EventPrinter& printer) {
-    addDemoTags(db, printer, kNode, {{BatchCountHandle, "BatchCount"}});
+void DiskTagStation::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
+    addDemoTags(db, printer, registered, kNode, {{BatchCountHandle, "BatchCount"}});
 }
 
 void DiskTagStation::tick(nodeDB& db, int32_t second) {

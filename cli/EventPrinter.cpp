@@ -2,11 +2,14 @@
 
 #include <algorithm>
 
-#include "cli/JsonWriter.h"
+#include "gateway/JsonWriter.h"
+#include "gateway/LinkStatusJson.h"
 #include "lang/Conversions.h"
 #include "lang/Object.h"
 
 namespace maroset::cli {
+
+using gateway::JsonWriter;
 
 namespace {
 
@@ -91,6 +94,7 @@ void EventPrinter::reply(const Reply& r) {
         if (!r.ok) {
             j.key("error").beginObject().key("number").integer(r.number);
             j.key("description").string(r.description).endObject();
+            if (!r.node.empty()) j.key("node").string(r.node);
         }
         if (r.ok && r.nodes) {
             j.key("nodes").beginArray();
@@ -98,6 +102,11 @@ void EventPrinter::reply(const Reply& r) {
                 j.beginObject().key("name").string(n.name).key("driver").value(n.driver);
                 j.endObject();
             }
+            j.endArray();
+        }
+        if (r.ok && r.status) {
+            j.key("nodes").beginArray();
+            for (const auto& s : *r.status) gateway::LinkStatusJson::Write(j, s);
             j.endArray();
         }
         line(j.endObject().str());
@@ -120,8 +129,31 @@ void EventPrinter::reply(const Reply& r) {
                 text += printable(n.name) + " (" + printable(driver) + ")";
             }
         }
+        if (r.status) {
+            text += ": ";
+            if (r.status->empty()) text += "no nodes";
+            for (size_t i = 0; i < r.status->size(); ++i)
+                text += (i ? "; " : "") + ReadableStatus((*r.status)[i]);
+        }
     }
     line(text);
+}
+
+std::string EventPrinter::ReadableStatus(const LinkStatus& s) {
+    const LinkCounters& c = s.counters;
+    auto at = [](platform::DateTime t) {
+        return platform::FormatShortDate(t) + " " + platform::FormatLongTime(t);
+    };
+    std::string text = printable(s.node) + " (" + printable(s.driver) + ") " +
+                       std::string(LinkStateName(s.state)) + " since " + at(s.since);
+    text += ", " + std::to_string(c.requests) + " requests, " + std::to_string(c.replies) +
+            " replies, " + std::to_string(c.timeouts) + " time-outs, " +
+            std::to_string(c.retries) + " retries, " + std::to_string(c.badChecks) +
+            " bad checks, " + std::to_string(c.reconnects) + " reconnects, " +
+            std::to_string(c.values) + " values, " + std::to_string(c.driverErrors) +
+            " driver errors";
+    if (s.last) text += ", last: " + printable(s.last->text) + " at " + at(s.last->time);
+    return text;
 }
 
 std::string EventPrinter::Readable(const Variant& v) {

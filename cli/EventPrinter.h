@@ -7,6 +7,7 @@
 #include <string_view>
 
 #include "cli/Reply.h"
+#include "core/LinkStatus.h"
 #include "lang/Variant.h"
 #include "lang/VbArray.h"
 
@@ -21,12 +22,15 @@ namespace maroset::cli {
 //   {"reply":"write","ok":true}
 //   {"reply":"write","ok":false,"error":{"number":13,"description":"Type mismatch"}}
 //   {"reply":"nodes","ok":true,"nodes":[{"name":"Line1","driver":"DISKTAG"}]}
+//   {"reply":"status","ok":true,"nodes":[{"name":"Line1","driver":"DISKTAG","link":{...}}]}
+//   {"reply":"read","ok":false,"error":{"number":91,"description":"..."},"node":"Pump"}
 // Readable lines:
 //   ValueChange  7 = 3.5, 8 = "on"
 //   DriverError  OPC  ClsDriverOPC.AddItem: message
 //   write: ok
 //   write: error 13: Type mismatch
 //   nodes: ok: Line1 (DISKTAG), Mem (MEMTAG)
+//   status: ok: Line1 (DISKTAG) local since 3/7/2026 9:00:00 AM, 0 requests, ...; Mem ...
 // Readable text is written as the bytes it is; JSON escapes them (see JsonWriter).
 class EventPrinter {
   public:
@@ -51,6 +55,9 @@ class EventPrinter {
     // A value as readable output shows it: numbers as CStr, True/False, text in double quotes,
     // Empty, Null, arrays in parentheses.
     static std::string Readable(const Variant& v);
+    // A node's link status on one line: "Line1 (NUVABDF1) up since 3/7/2026 9:00:00 AM, 12
+    // requests, ..., last: TEXT at DATE TIME".
+    static std::string ReadableStatus(const LinkStatus& status);
 
   private:
     std::ostream& out_;

@@ -10,6 +10,7 @@
 #include "cli/CommandTokenizer.h"
 #include "cli/UsageError.h"
 #include "core/ClsNodeDBInterface.h"
+#include "core/LinkStatusBoard.h"
 #include "core/Runtime.h"
 #include "core/nodeDB.h"
 #include "lang/Strings.h"
@@ -47,6 +48,7 @@ const char* const HostSession::Usage =
     "  addnode NAME DRIVER [TOPIC [SCANRATE [PREFIX]]]  add a node by hand\n"
     "  removenode NAME | removeall   remove one node or all of them\n"
     "  nodes                         list the nodes\n"
+    "  status [NODE]                 the link status of every node, or of one\n"
     "  sleep MS                      let the loop run MS ms before the next command\n"
     "  quit                          stop scanning, remove all nodes and exit (also at end\n"
     "                                of input)\n"
@@ -64,6 +66,7 @@ const HostSession::Command HostSession::Commands[] = {
     {"removenode", &HostSession::removenode},
     {"removeall", &HostSession::removeall},
     {"nodes", &HostSession::nodes},
+    {"status", &HostSession::status},
     {"sleep", &HostSession::sleep},
     {"quit", &HostSession::quit},
 };
@@ -89,41 +92,16 @@ void noMore(CommandTokenizer& args) {
 }
 
 HostOptions parseOptions(const std::vector<std::string>& args, bool& help) {
-    CommandLine cl({{"drive-root", true},
-                    {"com", true, true},
-                    {"modbus-port", true},
-                    {"trap"},
-                    {"trace"},
-                    {"json"}});
+    auto declared = HostOptions::Declared();
+    declared.push_back({"json"});
+    CommandLine cl(declared);
     cl.parse(args);
     help = cl.help();
     HostOptions options;
     if (help) return options;
     cl.requireOperands(1, 1);
     options.project = cl.operands()[0];
-    if (auto root = cl.value("drive-root")) {
-        if (root->empty()) throw UsageError("option '--drive-root' needs a directory");
-        options.driveRoot = std::filesystem::absolute(*root);
-    }
-    for (const auto& com : cl.values("com")) {
-        const auto eq = com.find('=');
-        const std::string left = com.substr(0, eq);
-        const auto colon = left.rfind(':');
-        const std::string node = colon == std::string::npos ? "" : left.substr(0, colon);
-        const auto port = eq == std::string::npos
-                              ? std::nullopt
-                              : CommandLine::ParseInteger(left.substr(colon + 1));
-        if (!port || *port < 1 || *port > 255 || eq + 1 >= com.size() ||
-            (colon != std::string::npos && node.empty()))
-            throw UsageError(
-                "option '--com' needs N=DEVICE or NODE:N=DEVICE with N from 1 to "
-                "255, not '" +
-                com + "'");
-        options.serialPorts.push_back({node, *port, com.substr(eq + 1)});
-    }
-    options.modbusPort = cl.integer("modbus-port", 1, 65535);
-    options.trap = cl.has("trap");
-    options.trace = cl.has("trace");
+    options.read(cl);
     options.json = cl.has("json");
     return options;
 }
@@ -149,17 +127,7 @@ int HostSession::Main(const std::vector<std::string>& args) {
 
 HostSession::HostSession(HostOptions options, std::ostream& out, int inputFd)
     : options_(std::move(options)), printer_(out, options_.json), inputFd_(inputFd) {
-    Runtime& rt = Runtime::current();
-    if (options_.driveRoot) rt.files().setDriveRoot(*options_.driveRoot);
-    for (const auto& m : options_.serialPorts) rt.mapSerialPort(m.port, m.device, m.node);
-    if (options_.modbusPort) rt.setModbusPort(*options_.modbusPort);
-    if (options_.trap) rt.trap().setEnabled(true);
-    if (options_.trace) {
-        // Standard error, flushed per line: events and replies on standard output stay as
-        // they are, and a user watching a line sees each incident as it happens.
-        rt.trace().setSink(
-            [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
-    }
+    options_.apply();
 }
 
 HostSession::~HostSession() {
@@ -185,23 +153,6 @@ std::shared_ptr<node> HostSession::nodeNamed(const std::string& name) {
     return n;
 }
 
-bool HostSession::projectExists() const {
-    // The library takes a path with a drive letter or a backslash as a path on drive C:.
-    const std::string& name = options_.project;
-    const bool drivePath =
-        (name.size() >= 2 && name[1] == ':') || name.find('\\') != std::string::npos;
-    std::filesystem::path file = name;
-    if (drivePath) {
-        try {
-            file = Runtime::current().files().resolve(name);
-        } catch (const VbError&) {
-            return true;  // the load reports what is wrong with the path
-        }
-    }
-    std::error_code ec;
-    return std::filesystem::exists(file, ec);
-}
-
 template <class Operation>
 void HostSession::guarded(Reply& reply, Operation&& operation) {
     try {
@@ -218,7 +169,7 @@ void HostSession::guarded(Reply& reply, Operation&& operation) {
 }
 
 int HostSession::run() {
-    if (!projectExists()) {
+    if (!options_.projectExists()) {
         std::cerr << "maroset run: project database '" << options_.project << "' not found\n";
         return 1;
     }
@@ -326,32 +277,35 @@ void HostSession::finish() {
     loop().post([this] { loop().stop(); });
 }
 
-void HostSession::add(CommandTokenizer& args, Reply&) {
+void HostSession::add(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
     const int32_t handle = integer(args, "HANDLE");
     const std::string address = args.rest();
     if (address.empty()) throw BadCommand("missing ADDRESS");
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->AddTag(handle, address);
 }
 
-void HostSession::remove(CommandTokenizer& args, Reply&) {
+void HostSession::remove(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
     const int32_t handle = integer(args, "HANDLE");
     noMore(args);
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->RemoveTag(handle);
 }
 
-void HostSession::read(CommandTokenizer& args, Reply&) {
+void HostSession::read(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
     const int32_t handle = integer(args, "HANDLE");
     noMore(args);
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->ReadTag(handle);
 }
 
-void HostSession::write(CommandTokenizer& args, Reply&) {
+void HostSession::write(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
     // The handle travels as the text given; the node converts it.
     const std::string handle = word(args, "HANDLE");
@@ -359,17 +313,19 @@ void HostSession::write(CommandTokenizer& args, Reply&) {
     if (!value) throw BadCommand("missing VALUE");
     noMore(args);
     const Variant v = CommandTokenizer::ParseValue(*value);
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->WriteTag(handle, v);
 }
 
-void HostSession::writearray(CommandTokenizer& args, Reply&) {
+void HostSession::writearray(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NODE");
     const std::string handle = word(args, "HANDLE");
     std::vector<Variant> items;
     while (auto value = args.next()) items.push_back(CommandTokenizer::ParseValue(*value));
     if (items.empty()) throw BadCommand("missing VALUE");
     VbArray<Variant> values(0, std::move(items));
+    reply.node = name;
     const auto n = nodeNamed(name);
     n->WriteArray(handle, values);
 }
@@ -384,7 +340,7 @@ void HostSession::stop(CommandTokenizer& args, Reply&) {
     db().StopScanning();
 }
 
-void HostSession::addnode(CommandTokenizer& args, Reply&) {
+void HostSession::addnode(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NAME");
     const std::string driver = word(args, "DRIVER");
     std::string topic;
@@ -396,12 +352,14 @@ void HostSession::addnode(CommandTokenizer& args, Reply&) {
         if (!args.atEnd()) prefix = integer(args, "PREFIX");
     }
     noMore(args);
+    reply.node = name;
     db().AddNode(name, driver, topic, scanRate, prefix);
 }
 
-void HostSession::removenode(CommandTokenizer& args, Reply&) {
+void HostSession::removenode(CommandTokenizer& args, Reply& reply) {
     const std::string name = word(args, "NAME");
     noMore(args);
+    reply.node = name;
     db().RemoveNode(name);
 }
 
@@ -415,6 +373,21 @@ void HostSession::nodes(CommandTokenizer& args, Reply& reply) {
     std::vector<Reply::NodeEntry> list;
     for (const auto& n : db().nodes()) list.push_back({n->Name, n->DriverName});
     reply.nodes = std::move(list);
+}
+
+void HostSession::status(CommandTokenizer& args, Reply& reply) {
+    const auto name = args.next();
+    noMore(args);
+    const LinkStatusBoard& board = Runtime::current().linkStatus();
+    if (!name) {
+        reply.status = board.All();
+        return;
+    }
+    reply.node = name->text;
+    const auto n = nodeNamed(name->text);
+    std::vector<LinkStatus> one;
+    if (const LinkStatus* s = board.Find(n->Name)) one.push_back(*s);
+    reply.status = std::move(one);
 }
 
 void HostSession::sleep(CommandTokenizer& args, Reply&) {

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "cli/EventPrinter.h"
+#include "cli/HostOptions.h"
 #include "cli/Reply.h"
 #include "lang/Subscription.h"
 #include "platform/EventLoop.h"
@@ -24,22 +25,6 @@ class nodeDB;
 namespace maroset::cli {
 
 class CommandTokenizer;
-
-// How `maroset run` sets up the runtime before it loads the project.
-struct HostOptions {
-    struct SerialMapping {
-        std::string node;  // empty: every node
-        int32_t port;
-        std::string device;
-    };
-    std::string project;
-    std::optional<std::filesystem::path> driveRoot;
-    std::vector<SerialMapping> serialPorts;  // --com [NODE:]N=DEVICE
-    std::optional<int32_t> modbusPort;
-    bool trap = false;
-    bool trace = false;
-    bool json = false;
-};
 
 // `maroset run`: a scriptable host. It loads the project with AddAllNodes, then reads
 // commands from its input one line at a time while the runtime's loop keeps running, and
@@ -83,7 +68,6 @@ class HostSession {
     platform::EventLoop& loop();
     maroset::nodeDB& db();
     std::shared_ptr<node> nodeNamed(const std::string& name);
-    bool projectExists() const;
 
     void watchInput();
     void onInput();
@@ -106,6 +90,7 @@ class HostSession {
     void removenode(CommandTokenizer& args, Reply& reply);
     void removeall(CommandTokenizer& args, Reply& reply);
     void nodes(CommandTokenizer& args, Reply& reply);
+    void status(CommandTokenizer& args, Reply& reply);
     void sleep(CommandTokenizer& args, Reply& reply);
     void quit(CommandTokenizer& args, Reply& reply);
     void quitNow(Reply& reply);

@@ -34,9 +34,9 @@ void IntechStation::startSimulator() {
     rt.mapSerialPort(1, simulator_->endpoint(), kNode);
 }
 
-void IntechStation::addTags(nodeDB& db, EventPrinter& printer) {
+void IntechStation::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
     // One tag per reply, so that each value change reports one value.
-    addDemoTags(db, printer, kNode,
+    addDemoTags(db, printer, registered, kNode,
                 {{FirstHandle, "01LAI1"},
                  {FirstHandle + 1, "01LAI6"},
                  {FirstHandle + 2, "01EAI17"},

@@ -26,7 +26,7 @@ class IntechStation : public DemoStation {
     std::string title() const override { return "an Intech instrument"; }
     void addNodes(const std::filesystem::path& project) override;
     void startSimulator() override;
-    void addTags(nodeDB& db, EventPrinter& printer) override;
+    void addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) override;
     void tick(nodeDB& db, int32_t second) override;
     void stopSimulator() override;
 

@@ -15,8 +15,8 @@ void MemoryTagStation::addNodes(const std::filesystem::path& project) {
     ProjectDatabase::AddNode(project, {{"Name", Variant(kNode)}, {"Driver", Variant("MEMTAG")}});
 }
 
-void MemoryTagStation::addTags(nodeDB& db, EventPrinter& printer) {
-    addDemoTags(db, printer, kNode, {{SetpointHandle, "Setpoint"}, {RunningHandle, "Running"}});
+void MemoryTagStation::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
+    addDemoTags(db, printer, registered, kNode, {{SetpointHandle, "Setpoint"}, {RunningHandle, "Running"}});
 }
 
 void MemoryTagStation::tick(nodeDB& db, int32_t second) {

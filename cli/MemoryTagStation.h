@@ -13,7 +13,7 @@ class MemoryTagStation : public DemoStation {
 
     std::string title() const override { return "memory tags"; }
     void addNodes(const std::filesystem::path& project) override;
-    void addTags(nodeDB& db, EventPrinter& printer) override;
+    void addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) override;
     void tick(nodeDB& db, int32_t second) override;
 };
 

@@ -18,8 +18,8 @@ void OpcStation::addNodes(const std::filesystem::path& project) {
                                        {"UpdateRate", Variant(500)}});
 }
 
-void OpcStation::addTags(nodeDB& db, EventPrinter& printer) {
-    addDemoTags(db, printer, kNode,
+void OpcStation::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
+    addDemoTags(db, printer, registered, kNode,
                 {{RampHandle, "Ramp.Seconds"}, {SetpointHandle, "Static.Setpoint"}});
 }
 

@@ -15,7 +15,7 @@ class OpcStation : public DemoStation {
 
     std::string title() const override { return "an OPC server"; }
     void addNodes(const std::filesystem::path& project) override;
-    void addTags(nodeDB& db, EventPrinter& printer) override;
+    void addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) override;
     void tick(nodeDB& db, int32_t second) override;
 };
 

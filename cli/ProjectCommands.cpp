@@ -2,20 +2,25 @@
 
 #include <algorithm>
 #include <iostream>
+#include <optional>
 
 #include "cli/CommandLine.h"
 #include "cli/EventPrinter.h"
-#include "cli/JsonWriter.h"
+#include "gateway/JsonWriter.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/UsageError.h"
+#include "gateway/TagTable.h"
 #include "lang/VbError.h"
 
 namespace maroset::cli {
+
+using gateway::JsonWriter;
 
 const char* const ProjectCommands::Usage =
     "usage: maroset project init PATH\n"
     "       maroset project add PATH NAME DRIVER [options]\n"
     "       maroset project list PATH [--json]\n"
+    "       maroset project tag add|remove|list PATH ...\n"
     "\n"
     "Creates and edits a project database: an SQLite file with a Nodes table (Name, Driver,\n"
     "OPCServer, OPCTopic, UpdateRate, CommPort, BaudRate, TagPrefex, IPAddress, Port).\n"
@@ -52,6 +57,15 @@ const char* const ProjectCommands::ListUsage =
     "Lists the nodes of the project database PATH, one per line: name, driver and the\n"
     "columns that are set. With --json, one JSON object per node with every column.\n";
 
+const char* const ProjectCommands::TagUsage =
+    "usage: maroset project tag add PATH NODE HANDLE ADDRESS [--name NAME]\n"
+    "       maroset project tag remove PATH NODE HANDLE\n"
+    "       maroset project tag list PATH [--json]\n"
+    "\n"
+    "Edits the Tags table of the project database PATH: the tags `maroset serve` registers\n"
+    "on each node (AddTag) before it starts scanning. HANDLE is 1 to 32767 and unique on its\n"
+    "node; NAME defaults to the address.\n";
+
 namespace {
 
 int usageError(const char* usage, const std::string& message) {
@@ -78,6 +92,7 @@ int ProjectCommands::Main(const std::vector<std::string>& args) {
     if (command == "init") return Init(rest);
     if (command == "add") return Add(rest);
     if (command == "list") return List(rest);
+    if (command == "tag") return Tag(rest);
     return usageError(Usage, "unknown command '" + command + "'");
 }
 
@@ -216,6 +231,77 @@ int ProjectCommands::List(const std::vector<std::string>& args) {
         std::cout << line << "\n";
     }
     return 0;
+}
+
+int ProjectCommands::Tag(const std::vector<std::string>& args) {
+    const std::string command = args.empty() ? "" : args[0];
+    const std::vector<std::string> rest(args.begin() + (args.empty() ? 0 : 1), args.end());
+    CommandLine cl({{"name", true}, {"json"}});
+    try {
+        cl.parse(rest);
+        if (cl.help() || command == "--help" || command == "-h") {
+            std::cout << TagUsage;
+            return 0;
+        }
+        if (command == "add") cl.requireOperands(4, 4);
+        else if (command == "remove") cl.requireOperands(3, 3);
+        else if (command == "list") cl.requireOperands(1, 1);
+        else throw UsageError(command.empty() ? "missing command" : "unknown command '" + command + "'");
+        if (cl.has("name") && command != "add") throw UsageError("--name goes with add only");
+        if (cl.has("json") && command != "list") throw UsageError("--json goes with list only");
+    } catch (const UsageError& e) {
+        return usageError(TagUsage, e.what());
+    }
+    const auto& ops = cl.operands();
+    const std::string& path = ops[0];
+    std::optional<int32_t> handle;
+    if (command != "list") {
+        handle = CommandLine::ParseInteger(ops[2]);
+        if (!handle || *handle < 1 || *handle > gateway::TagTable::MaxHandle)
+            return usageError(TagUsage, "HANDLE must be a whole number from 1 to 32767, not '" +
+                                            ops[2] + "'");
+    }
+    try {
+        if (command == "add") {
+            gateway::TagTable::Add(path, {ops[1], *handle, ops[3], cl.value("name").value_or("")});
+            std::cout << "Added tag " << *handle << " (" << ops[3] << ") on " << ops[1] << " to "
+                      << path << "\n";
+            return 0;
+        }
+        if (command == "remove") {
+            if (!gateway::TagTable::Remove(path, ops[1], *handle)) {
+                std::cerr << "maroset project: " << path << " has no tag " << *handle << " on "
+                          << ops[1] << "\n";
+                return 1;
+            }
+            std::cout << "Removed tag " << *handle << " on " << ops[1] << " from " << path << "\n";
+            return 0;
+        }
+        const auto rows = gateway::TagTable::Rows(path);
+        if (cl.has("json")) {
+            for (const auto& row : rows) {
+                JsonWriter j;
+                j.beginObject().key("node").string(row.node).key("handle").integer(row.handle);
+                j.key("address").string(row.address).key("name").string(row.name);
+                std::cout << j.endObject().str() << "\n";
+            }
+            return 0;
+        }
+        if (rows.empty()) std::cout << "No tags in " << path << "\n";
+        for (const auto& row : rows) {
+            std::cout << row.node << " " << row.handle << " " << row.address;
+            if (row.name != row.address) std::cout << " (" << row.name << ")";
+            std::cout << "\n";
+        }
+        return 0;
+    } catch (const VbError& e) {
+        if (e.number() == err::DuplicateKey) {
+            std::cerr << "maroset project: " << path << " already has tag " << *handle << " on "
+                      << ops[1] << "\n";
+            return 1;
+        }
+        return databaseError(path, e);
+    }
 }
 
 }  // namespace maroset::cli

@@ -5,12 +5,14 @@
 #include <string>
 #include <vector>
 
+#include "core/LinkStatus.h"
 #include "lang/Variant.h"
 
 namespace maroset::cli {
 
 // The answer to one command of `maroset run`: its name (the command word), success or the
-// run-time error it ended with, and what the command reports besides (the node list).
+// run-time error it ended with, and what the command reports besides (the node list, the
+// link status).
 struct Reply {
     struct NodeEntry {
         std::string name;
@@ -26,6 +28,9 @@ struct Reply {
     // Why a command line was refused; shown in readable output only.
     std::string detail;
     std::optional<std::vector<NodeEntry>> nodes;
+    std::optional<std::vector<LinkStatus>> status;
+    // The node the command is about; an error reply names it.
+    std::string node;
 
     void fail(int32_t errorNumber, std::string errorDescription, std::string why = {}) {
         if (!ok) return;  // the first error is the one reported
@@ -34,6 +39,7 @@ struct Reply {
         description = std::move(errorDescription);
         detail = std::move(why);
         nodes.reset();
+        status.reset();
     }
 };
 

@@ -29,8 +29,8 @@ void SoftPlcStation::startSimulator() {
     simulator_ = sim::SoftPlcSimulator::OnLoopback(0, options);
 }
 
-void SoftPlcStation::addTags(nodeDB& db, EventPrinter& printer) {
-    addDemoTags(db, printer, kNode,
+void SoftPlcStation::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
+    addDemoTags(db, printer, registered, kNode,
                 {{LevelHandle, "Level"}, {FlowHandle, "Flow"}, {SetpointHandle, "Setpoint"}});
 }
 

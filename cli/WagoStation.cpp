@@ -30,8 +30,8 @@ void WagoStation::startSimulator() {
     Runtime::current().setModbusPort(coupler_->port());
 }
 
-void WagoStation::addTags(nodeDB& db, EventPrinter& printer) {
-    addDemoTags(db, printer, kNode,
+void WagoStation::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
+    addDemoTags(db, printer, registered, kNode,
                 {{CountHandle, "IW0"},
                  {SwingHandle, "IW1"},
                  {InputBitHandle, "ID0.1"},

@@ -10,14 +10,16 @@
 #include "cli/Demo.h"
 #include "cli/HostSession.h"
 #include "cli/ProjectCommands.h"
+#include "cli/ServeCommand.h"
 #include "cli/SimCommand.h"
 
 namespace {
 
 constexpr const char* kUsage =
     "usage: maroset run PROJECT [options]      serve commands on a project (see run --help)\n"
-    "       maroset project init|add|list ...  create and edit a project database\n"
-    "       maroset demo [--seconds N] [--json]  watch a small project live\n"
+    "       maroset serve PROJECT [options]    a project as a service: HTTP API and page\n"
+    "       maroset project init|add|list|tag ...  create and edit a project database\n"
+    "       maroset demo [--seconds N] [--json] [--http [ADDR:PORT]]  watch a small project live\n"
     "       maroset sim KIND [options]         run one device simulator (see sim --help)\n"
     "       maroset COMMAND --help             help on one command\n";
 
@@ -48,6 +50,7 @@ int main(int argc, char** argv) {
         return 0;
     }
     if (command == "run") return maroset::cli::HostSession::Main(args);
+    if (command == "serve") return maroset::cli::ServeCommand::Main(args);
     if (command == "project") return maroset::cli::ProjectCommands::Main(args);
     if (command == "demo") return maroset::cli::Demo::Main(args);
     if (command == "sim") return maroset::cli::SimCommand::Main(args);

@@ -7,6 +7,7 @@
 #include <string_view>
 #include <system_error>
 
+#include "lang/Conversions.h"
 #include "platform/SqliteConnection.h"
 
 namespace maroset::platform {
@@ -104,6 +105,36 @@ void Database::Execute(const std::string& sql) {
     if (sqlite3_column_count(statement.get()) > 0 && sqlite3_stmt_readonly(statement.get()))
         throw VbError(dberr::CannotExecuteSelect, "Cannot execute a select query.");
     while (connection_->Step(statement.get(), sql)) {
+    }
+}
+
+void Database::Execute(const std::string& sql, const std::vector<Variant>& parameters) {
+    auto statement = connection_->Prepare(sql);
+    sqlite3_stmt* s = statement.get();
+    if (sqlite3_bind_parameter_count(s) != static_cast<int>(parameters.size()))
+        throw VbError(dberr::TooFewParameters, "Too few parameters.");
+    for (size_t i = 0; i < parameters.size(); ++i) {
+        const Variant& v = parameters[i];
+        const int index = static_cast<int>(i) + 1;
+        switch (v.type()) {
+            case VarType::Empty:
+            case VarType::Null:
+                sqlite3_bind_null(s, index);
+                break;
+            case VarType::Single:
+            case VarType::Double:
+                sqlite3_bind_double(s, index, CDbl(v));
+                break;
+            case VarType::String:
+                sqlite3_bind_text(s, index, v.string().data(),
+                                  static_cast<int>(v.string().size()), SQLITE_TRANSIENT);
+                break;
+            default:
+                sqlite3_bind_int64(s, index, CLng(v));
+                break;
+        }
+    }
+    while (connection_->Step(s, sql)) {
     }
 }
 

@@ -3,7 +3,9 @@
 #include <filesystem>
 #include <memory>
 #include <string>
+#include <vector>
 
+#include "lang/Variant.h"
 #include "platform/Recordset.h"
 
 namespace maroset::platform {
@@ -49,6 +51,10 @@ class Database {
     // Runs one statement that returns no rows (table and index definitions, updates). A query
     // fails with Cannot execute a select query (3065).
     void Execute(const std::string& sql);
+    // The same with `?` parameters bound to values, so no value is ever spliced into the
+    // statement's text: integers, Booleans and dates as integers, Single and Double as reals,
+    // text as text, Empty and Null as NULL.
+    void Execute(const std::string& sql, const std::vector<Variant>& parameters);
 
     const std::filesystem::path& file() const;
 

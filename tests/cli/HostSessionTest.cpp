@@ -23,7 +23,8 @@ std::string reply(const std::string& name, const std::string& rest = "\"ok\":tru
     return "{\"reply\":\"" + name + "\"," + rest + "}";
 }
 
-std::string failure(const std::string& name, int number) {
+// An error reply; one about a node names it.
+std::string failure(const std::string& name, int number, const std::string& node = "") {
     // clang-format off
     static const std::map<int, std::string> descriptions{
         {5, "Invalid procedure call or argument"}, {6, "Overflow"}, {9, "Subscript out of range"},
@@ -31,7 +32,8 @@ std::string failure(const std::string& name, int number) {
         {457, "This key is already associated with an element of this collection"}};
     // clang-format on
     return reply(name, "\"ok\":false,\"error\":{\"number\":" + std::to_string(number) +
-                           ",\"description\":\"" + descriptions.at(number) + "\"}");
+                           ",\"description\":\"" + descriptions.at(number) + "\"}" +
+                           (node.empty() ? "" : ",\"node\":\"" + node + "\""));
 }
 
 std::string valueChange(const std::string& handle, const std::string& value) {
@@ -147,7 +149,8 @@ TEST_F(HostCommands, RefusedCommandsAreErrorRepliesAndTheSessionGoesOn) {
     for (const auto& [lines, number] : refused) {
         for (const auto& line : lines) {
             input += line + "\n";
-            expected.push_back(failure(line.substr(0, line.find(' ')), number));
+            expected.push_back(failure(line.substr(0, line.find(' ')), number,
+                                       number == 91 ? "Nope" : ""));
         }
     }
     expected.insert(expected.end(), {valueChange("7", "1"), reply("write"), reply("quit")});
@@ -164,10 +167,10 @@ TEST_F(HostCommands, CommandsRunInOrderAndQuitIgnoresTheRest) {
                          "quit\nwrite Mem 7 2\n"),
               (Lines{reply("load"), reply("add"), reply("start"), reply("sleep"),
                      valueChange("7", "1"), reply("write"), reply("writearray"), reply("stop"),
-                     reply("addnode"), failure("addnode", 457),
+                     reply("addnode"), failure("addnode", 457, "extra"),
                      nodesReply("{\"name\":\"Mem\",\"driver\":\"MEMTAG\"},"
                                 "{\"name\":\"Extra\",\"driver\":\"MemTag\"}"),
-                     reply("removenode"), failure("removenode", 5), failure("write", 91),
+                     reply("removenode"), failure("removenode", 5, "Mem"), failure("write", 91, "Mem"),
                      reply("removeall"), nodesReply(""), reply("quit")}));
 }
 
@@ -192,12 +195,12 @@ TEST_F(HostFixture, DiskTagValuesSurviveARestartOfTheCommand) {
     EXPECT_TRUE(std::filesystem::exists(driveRoot() / "NUVDiskIO" / "Line1.mdb"));
     EXPECT_EQ(RunCli(runArgs(), "add Line1 5 Level\nread Line1 5\nwrite Line1 6 1\n").lines,
               (Lines{reply("load"), reply("add"), valueChange("5", "\"12.5\""), reply("read"),
-                     failure("write", 9), reply("quit")}));
+                     failure("write", 9, "Line1"), reply("quit")}));
 }
 
 TEST_F(HostCommands, TrapLogsErrorsUnderTheDriveRootAndTheReplyIsOk) {
     EXPECT_EQ(memSession("write Mem seven 1\n"),
-              (Lines{reply("load"), reply("add"), failure("write", 13), reply("quit")}));
+              (Lines{reply("load"), reply("add"), failure("write", 13, "Mem"), reply("quit")}));
     EXPECT_FALSE(std::filesystem::exists(driveRoot() / "MarosetErrors.txt"));
     // The port options are taken along.
     EXPECT_EQ(memSession("write Mem seven 1\n",
@@ -208,6 +211,49 @@ TEST_F(HostCommands, TrapLogsErrorsUnderTheDriveRootAndTheReplyIsOk) {
     const std::string log{std::istreambuf_iterator<char>(in), {}};
     EXPECT_NE(log.find("Error #13"), std::string::npos) << log;
     EXPECT_NE(log.find("Module\\Sub: node.WriteTag"), std::string::npos) << log;
+}
+
+// ---- Link status ---------------------------------------------------------------------------
+
+class HostStatus : public HostFixture {
+  protected:
+    HostStatus() {
+        makeProject(
+            "INSERT INTO Nodes (Name, Driver) VALUES ('Mem', 'MEMTAG');"
+            "INSERT INTO Nodes (Name, Driver, OPCServer) VALUES ('Opc', 'OPC', 'No.Such.Server');");
+    }
+};
+
+TEST_F(HostStatus, StatusTellsTheLinksAndAnErrorAboutANodeNamesIt) {
+    const auto lines =
+        RunCli(runArgs(), "add Mem 1 A\nwrite Mem 1 5\nstatus\nstatus opc\nstatus Pump\n"
+                          "read Pump 1\nwrite Mem x 1\nnodes extra\n")
+            .lines;
+    ASSERT_EQ(lines.size(), 11u);
+    const std::string& all = lines[4];
+    EXPECT_EQ(all.rfind(R"({"reply":"status","ok":true,"nodes":[{"name":"Mem","driver":"MEMTAG","link":{"state":"local","since":")", 0),
+              0u)
+        << all;
+    EXPECT_NE(all.find(R"("values":1,"driverErrors":0},"last":null}})"), std::string::npos) << all;
+    EXPECT_NE(all.find(R"({"name":"Opc","driver":"OPC","link":{"state":"down",)"), std::string::npos);
+    EXPECT_NE(all.find(R"("last":{"text":"did not start: error )"), std::string::npos) << all;
+
+    EXPECT_EQ(lines[5].rfind(R"({"reply":"status","ok":true,"nodes":[{"name":"Opc",)", 0), 0u);
+    EXPECT_EQ(lines[5].find("Mem"), std::string::npos);
+    EXPECT_EQ(lines[6], failure("status", 91, "Pump"));
+    EXPECT_EQ(lines[7], failure("read", 91, "Pump"));
+    EXPECT_EQ(lines[8], failure("write", 13, "Mem"));
+    EXPECT_EQ(lines[9], failure("nodes", 5)) << "a command about no node names none";
+}
+
+TEST_F(HostStatus, ReadableStatusIsOneLineForAllNodes) {
+    const auto lines = RunCli(runArgs({}), "status\n").lines;
+    ASSERT_EQ(lines.size(), 3u);
+    EXPECT_EQ(lines[1].rfind("status: ok: Mem (MEMTAG) local since ", 0), 0u) << lines[1];
+    EXPECT_NE(lines[1].find(", 0 values, 0 driver errors; Opc (OPC) down since "),
+              std::string::npos)
+        << lines[1];
+    EXPECT_NE(lines[1].find(", last: did not start: error "), std::string::npos);
 }
 
 }  // namespace

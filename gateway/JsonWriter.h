@@ -6,8 +6,9 @@
 #include <vector>
 
 #include "lang/Variant.h"
+#include "platform/Clock.h"
 
-namespace maroset::cli {
+namespace maroset::gateway {
 
 // Builds one compact JSON text (no blanks), keys in the order they are written.
 //
@@ -33,6 +34,10 @@ class JsonWriter {
     // Numbers as CStr prints them (12.5, 1E+20), Booleans as true/false, text as a string,
     // Empty and Null as null, arrays element by element, objects by their default value.
     JsonWriter& value(const Variant& v);
+    // A value already written as JSON (by Quote, Number or another writer), as it is.
+    JsonWriter& raw(std::string_view json);
+    // A date and time in ISO 8601, local time to the millisecond: "2026-03-07T09:00:00.000".
+    JsonWriter& time(platform::DateTime t);
 
     const std::string& str() const { return out_; }
 
@@ -50,4 +55,4 @@ class JsonWriter {
     bool afterKey_ = false;
 };
 
-}  // namespace maroset::cli
+}  // namespace maroset::gateway

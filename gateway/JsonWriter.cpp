@@ -1,11 +1,12 @@
-#include "cli/JsonWriter.h"
+#include "gateway/JsonWriter.h"
 
 #include <cmath>
+#include <cstdio>
 
 #include "lang/Conversions.h"
 #include "lang/Object.h"
 
-namespace maroset::cli {
+namespace maroset::gateway {
 
 void JsonWriter::separate() {
     if (afterKey_) {
@@ -156,4 +157,23 @@ std::string JsonWriter::Number(const Variant& number) {
     return text;
 }
 
-}  // namespace maroset::cli
+JsonWriter& JsonWriter::raw(std::string_view json) {
+    separate();
+    out_ += json;
+    return *this;
+}
+
+JsonWriter& JsonWriter::time(platform::DateTime t) {
+    using namespace std::chrono;
+    const auto day = floor<days>(t);
+    const year_month_day ymd{day};
+    const hh_mm_ss<milliseconds> clock{t - day};
+    char text[64];
+    std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02ld:%02ld:%02ld.%03ld", int(ymd.year()),
+                  unsigned(ymd.month()), unsigned(ymd.day()), long(clock.hours().count()),
+                  long(clock.minutes().count()), long(clock.seconds().count()),
+                  long(clock.subseconds().count()));
+    return string(text);
+}
+
+}  // namespace maroset::gateway
