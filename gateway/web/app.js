@@ -51,9 +51,13 @@ function clock(iso) {
   return clockText;
 }
 
+// The number a trend draws for a value: devices that speak text (the soft PLC) report
+// numbers as text, and those are drawn too.
+const NUMBER_TEXT = /^\s*[-+]?(\d+\.?\d*|\.\d+)([eE][-+]?\d+)?\s*$/;
 function numeric(value) {
   if (typeof value === 'number') return value;
   if (typeof value === 'boolean') return value ? 1 : 0;
+  if (typeof value === 'string' && NUMBER_TEXT.test(value)) return Number(value);
   return null;
 }
 
