@@ -82,8 +82,9 @@ function renderNode(n) {
   const link = n.link || {};
   setLink(li, link.state || 'unknown', link.since);
   const counters = link.counters || {};
+  // Only what has happened: a row of zeros hides the one counter that moved.
   li.querySelector('.counters').textContent =
-      Object.entries(counters).map(([k, v]) => k + ' ' + v).join(' · ');
+      Object.entries(counters).filter(([, v]) => v).map(([k, v]) => k + ' ' + v).join(' · ');
   const last = link.last && link.last.text ? clock(link.last.time) + ' ' + link.last.text : '';
   li.querySelector('.last').textContent = last;
 }
@@ -353,9 +354,10 @@ async function write(row, input) {
     status.className = 'write-status ok';
     input.value = '';
   } else {
+    // The library's refusal carries number and description, the service's status and message.
     const error = answer.error || {};
     status.textContent = label + ': ' + (error.number ? error.number + ' ' : '') +
-                         (error.description || 'write refused (' + code + ')');
+                         (error.description || error.message || 'write refused (' + code + ')');
     status.className = 'write-status failed';
   }
 }
@@ -424,6 +426,8 @@ function start() {
     if (e.target.tagName === 'BUTTON') write(row, e.target.previousElementSibling);
     else if (!e.target.closest('.write') && row.trend) select(row);
   });
+  // A service that does not say whether it takes writes shows the boxes; its first refusal
+  // takes them away (403) or asks for the token (401).
   getJson('/api/info')
       .then((info) => setWrites(info.writes ? 'yes' : 'no', info.writes && info.token))
       .catch(() => setWrites('unknown', false));
