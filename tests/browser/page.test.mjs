@@ -1,6 +1,7 @@
 // The live page in a real browser: `maroset serve` on a project whose PLC is the soft-PLC
 // simulator, Debian's chromium headless. A value moved by the device reaches the page without
-// a reload, and a value typed into the page's write box reaches the device and comes back.
+// a reload, and a value typed into the page's write box reaches the device and comes back
+// once the page has the service's token.
 //
 //   node page.test.mjs MAROSET   (CHROMIUM overrides /usr/bin/chromium)
 import { spawn, execFileSync } from 'node:child_process';
@@ -69,7 +70,8 @@ async function main() {
   project('tag', 'add', db, 'PLC1', '2', 'Label', '--name', 'Batch label');
   project('tag', 'add', db, 'Mem', '1', 'Setpoint');
 
-  const serve = start(['serve', db, '--http', '127.0.0.1:0', '--allow-writes',
+  const token = 'page-test-token';
+  const serve = start(['serve', db, '--http', '127.0.0.1:0', '--allow-writes', '--token', token,
                        '--drive-root', join(dir, 'drive_c')]);
   const [, url] = await waitForOutput(serve, /listening on (http:\/\/127\.0\.0\.1:\d+\/)/,
                                       'the service\'s address');
@@ -103,10 +105,15 @@ async function main() {
   if (!(await page.evaluate(() => window.sameDocument))) throw new Error('the page reloaded');
 
   console.log(`value change arrived: ${first} -> ${await counter.textContent()}`);
-  // A write from the page's box reaches the device, which sends the value back.
+  // A write from the page's box reaches the device, which sends the value back; the first
+  // try has no token, is refused, and brings up the token field.
   const written = 'lot' + (Date.now() % 100000);
   const label = page.locator('[data-node="PLC1"][data-handle="2"]');
   await label.locator('input').fill(written);
+  await label.locator('button').click();
+  await page.locator('#token input').waitFor();
+  await page.waitForFunction(() => document.querySelector('#write-status.failed'));
+  await page.locator('#token input').fill(token);
   await label.locator('button').click();
   await page.waitForFunction(([cell, value]) => cell.textContent === value,
                              [await label.locator('[data-role="value"]').elementHandle(), written]);
