@@ -81,7 +81,8 @@ size_t ReadUntil(platform::EventLoop& loop, int fd, std::string_view end, std::s
         total += static_cast<size_t>(n);
         tail.append(buffer, static_cast<size_t>(n));
         if (tail.size() > 64) tail.erase(0, tail.size() - 64);
-        if (tail.size() >= end.size() && tail.compare(tail.size() - end.size(), end.size(), end) == 0)
+        if (tail.size() >= end.size() &&
+            tail.compare(tail.size() - end.size(), end.size(), end) == 0)
             return total;
     }
 }
@@ -105,7 +106,8 @@ void DriverReportsIntoTheEventStream(benchmark::State& state) {
     const Driver& driver = *project.mem->driver();
     for (auto _ : state) {
         ++turn;
-        for (int32_t i = 1; i <= perTurn; ++i) values(i) = Variant(static_cast<double>(turn) + i / 8.0);
+        for (int32_t i = 1; i <= perTurn; ++i)
+            values(i) = Variant(static_cast<double>(turn) + i / 8.0);
         ReportValues(driver, handles, values);
         bytes += ReadUntil(loop, fd, "]\n\n", tail);
     }

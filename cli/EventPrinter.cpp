@@ -147,11 +147,10 @@ std::string EventPrinter::ReadableStatus(const LinkStatus& s) {
     std::string text = printable(s.node) + " (" + printable(s.driver) + ") " +
                        std::string(LinkStateName(s.state)) + " since " + at(s.since);
     text += ", " + std::to_string(c.requests) + " requests, " + std::to_string(c.replies) +
-            " replies, " + std::to_string(c.timeouts) + " time-outs, " +
-            std::to_string(c.retries) + " retries, " + std::to_string(c.badChecks) +
-            " bad checks, " + std::to_string(c.reconnects) + " reconnects, " +
-            std::to_string(c.values) + " values, " + std::to_string(c.driverErrors) +
-            " driver errors";
+            " replies, " + std::to_string(c.timeouts) + " time-outs, " + std::to_string(c.retries) +
+            " retries, " + std::to_string(c.badChecks) + " bad checks, " +
+            std::to_string(c.reconnects) + " reconnects, " + std::to_string(c.values) +
+            " values, " + std::to_string(c.driverErrors) + " driver errors";
     if (s.last) text += ", last: " + printable(s.last->text) + " at " + at(s.last->time);
     return text;
 }

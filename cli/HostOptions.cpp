@@ -38,7 +38,7 @@ void HostOptions::read(const CommandLine& cl) {
     trace = cl.has("trace");
 }
 
-void HostOptions::apply() const {
+void HostOptions::apply(std::optional<TracePrinter>& trace) const {
     Runtime& rt = Runtime::current();
     if (driveRoot) rt.files().setDriveRoot(*driveRoot);
     for (const auto& m : serialPorts) rt.mapSerialPort(m.port, m.device, m.node);
@@ -47,8 +47,8 @@ void HostOptions::apply() const {
     if (trace) {
         // Standard error, flushed per line: events and replies on standard output stay as
         // they are, and a user watching a line sees each incident as it happens.
-        rt.trace().setSink(
-            [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
+        trace.emplace(rt.incidents(),
+                      [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
     }
 }
 
@@ -56,8 +56,7 @@ std::filesystem::path HostOptions::projectFile() const {
     // The library takes a path with a drive letter or a backslash as a path on drive C:.
     const bool drivePath =
         (project.size() >= 2 && project[1] == ':') || project.find('\\') != std::string::npos;
-    return drivePath ? Runtime::current().files().resolve(project)
-                     : std::filesystem::path(project);
+    return drivePath ? Runtime::current().files().resolve(project) : std::filesystem::path(project);
 }
 
 bool HostOptions::projectExists() const {

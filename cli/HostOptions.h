@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "cli/CommandLine.h"
+#include "core/TracePrinter.h"
 
 namespace maroset::cli {
 
@@ -29,9 +30,9 @@ struct HostOptions {
     static std::vector<CommandLine::Option> Declared();
     // Reads them from a parsed command line (UsageError when one is malformed).
     void read(const CommandLine& cl);
-    // Sets up the current runtime: drive root, serial ports, Modbus port, trap, and the trace
-    // to standard error.
-    void apply() const;
+    // Sets up the current runtime: drive root, serial ports, Modbus port, trap; with --trace,
+    // starts trace printing the link incidents to standard error, for as long as it lives.
+    void apply(std::optional<TracePrinter>& trace) const;
     // The project's file as a native path (a path on drive C: mapped to the drive root).
     std::filesystem::path projectFile() const;
     // Whether the project file is there (a path on drive C: that the load will judge counts).

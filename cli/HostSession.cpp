@@ -127,12 +127,12 @@ int HostSession::Main(const std::vector<std::string>& args) {
 
 HostSession::HostSession(HostOptions options, std::ostream& out, int inputFd)
     : options_(std::move(options)), printer_(out, options_.json), inputFd_(inputFd) {
-    options_.apply();
+    options_.apply(trace_);
 }
 
 HostSession::~HostSession() {
     if (inputWatch_) loop().unwatch(*inputWatch_);
-    Runtime::current().trace().setSink({});
+    trace_.reset();
     valueChange_.reset();
     driverError_.reset();
     host_.reset();

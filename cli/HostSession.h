@@ -13,6 +13,7 @@
 #include "cli/EventPrinter.h"
 #include "cli/HostOptions.h"
 #include "cli/Reply.h"
+#include "core/TracePrinter.h"
 #include "lang/Subscription.h"
 #include "platform/EventLoop.h"
 
@@ -101,6 +102,8 @@ class HostSession {
     std::unique_ptr<ClsNodeDBInterface> host_;
     Subscription valueChange_;
     Subscription driverError_;
+    // The link trace on standard error, with --trace.
+    std::optional<TracePrinter> trace_;
 
     std::string partial_;            // input after the last complete line
     std::deque<std::string> queue_;  // complete lines not run yet

@@ -16,7 +16,8 @@ void MemoryTagStation::addNodes(const std::filesystem::path& project) {
 }
 
 void MemoryTagStation::addTags(nodeDB& db, EventPrinter& printer, DemoTags& registered) {
-    addDemoTags(db, printer, registered, kNode, {{SetpointHandle, "Setpoint"}, {RunningHandle, "Running"}});
+    addDemoTags(db, printer, registered, kNode,
+                {{SetpointHandle, "Setpoint"}, {RunningHandle, "Running"}});
 }
 
 void MemoryTagStation::tick(nodeDB& db, int32_t second) {

@@ -6,9 +6,9 @@
 
 #include "cli/CommandLine.h"
 #include "cli/EventPrinter.h"
-#include "gateway/JsonWriter.h"
 #include "cli/ProjectDatabase.h"
 #include "cli/UsageError.h"
+#include "gateway/JsonWriter.h"
 #include "gateway/TagTable.h"
 #include "lang/VbError.h"
 
@@ -243,10 +243,15 @@ int ProjectCommands::Tag(const std::vector<std::string>& args) {
             std::cout << TagUsage;
             return 0;
         }
-        if (command == "add") cl.requireOperands(4, 4);
-        else if (command == "remove") cl.requireOperands(3, 3);
-        else if (command == "list") cl.requireOperands(1, 1);
-        else throw UsageError(command.empty() ? "missing command" : "unknown command '" + command + "'");
+        if (command == "add")
+            cl.requireOperands(4, 4);
+        else if (command == "remove")
+            cl.requireOperands(3, 3);
+        else if (command == "list")
+            cl.requireOperands(1, 1);
+        else
+            throw UsageError(command.empty() ? "missing command"
+                                             : "unknown command '" + command + "'");
         if (cl.has("name") && command != "add") throw UsageError("--name goes with add only");
         if (cl.has("json") && command != "list") throw UsageError("--json goes with list only");
     } catch (const UsageError& e) {
@@ -258,8 +263,8 @@ int ProjectCommands::Tag(const std::vector<std::string>& args) {
     if (command != "list") {
         handle = CommandLine::ParseInteger(ops[2]);
         if (!handle || *handle < 1 || *handle > gateway::TagTable::MaxHandle)
-            return usageError(TagUsage, "HANDLE must be a whole number from 1 to 32767, not '" +
-                                            ops[2] + "'");
+            return usageError(
+                TagUsage, "HANDLE must be a whole number from 1 to 32767, not '" + ops[2] + "'");
     }
     try {
         if (command == "add") {

@@ -71,7 +71,8 @@ int ServeCommand::Main(const std::vector<std::string>& args) {
         std::cerr << "maroset serve: " << e.what() << "\n" << Usage;
         return 2;
     }
-    options.apply();
+    std::optional<TracePrinter> trace;
+    options.apply(trace);
     if (!options.projectExists()) {
         std::cerr << "maroset serve: project database '" << options.project << "' not found\n";
         return 1;

@@ -12,7 +12,6 @@
 #include "platform/EventLoop.h"
 #include "platform/FileSystem.h"
 #include "platform/LinkIncidents.h"
-#include "platform/LinkTrace.h"
 #include "platform/opc/OpcServerRegistry.h"
 #include "platform/serial/SerialDevices.h"
 #include "platform/tcp/TcpNetwork.h"
@@ -68,9 +67,6 @@ class Runtime {
     // Where TCP clients connect (tests plug in-memory servers here).
     platform::TcpNetwork& tcp() { return tcp_; }
 
-    // The link trace drivers write to (off unless a host gives it a sink).
-    platform::LinkTrace& trace() { return trace_; }
-
     // The one stream of link incidents that drivers and port owners report to.
     platform::LinkIncidents& incidents() { return incidents_; }
     // Every value and error report, by node, for observers beside the host.
@@ -99,7 +95,6 @@ class Runtime {
     ErrorTrap trap_;
     platform::SerialDevices serialDevices_;
     platform::TcpNetwork tcp_;
-    platform::LinkTrace trace_;
     platform::LinkIncidents incidents_{*clock_};
     ReportTap reports_;
     LinkStatusBoard linkStatus_{incidents_, reports_, *clock_};

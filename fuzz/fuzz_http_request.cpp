@@ -24,9 +24,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     auto loop = std::make_unique<platform::VirtualEventLoop>();
     platform::VirtualEventLoop& virtualLoop = *loop;
     auto clock = std::make_unique<platform::VirtualClock>(virtualLoop, platform::ZeroDate);
-    ScopedRuntime scope(std::make_unique<Runtime>(
-        std::move(loop), std::move(clock),
-        std::filesystem::temp_directory_path() / "maroset-fuzz-http"));
+    ScopedRuntime scope(
+        std::make_unique<Runtime>(std::move(loop), std::move(clock),
+                                  std::filesystem::temp_directory_path() / "maroset-fuzz-http"));
     Runtime& rt = *scope;
     ClsNodeDBInterface host;
     nodeDB& db = *host.nodeDB();
@@ -49,7 +49,12 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
 
     const gateway::HttpResponse response = api.handle(request);
     switch (response.status) {
-        case 200: case 400: case 401: case 403: case 404: case 405:
+        case 200:
+        case 400:
+        case 401:
+        case 403:
+        case 404:
+        case 405:
             break;
         default:
             std::abort();

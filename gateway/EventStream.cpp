@@ -41,15 +41,15 @@ EventStream::EventStream(platform::EventLoop& loop, ReportTap& reports, LinkStat
     valuesTap_ = reports.Values.subscribe(
         [this](std::string_view node, const VbArray<int32_t>& handles, int16_t count,
                const VbArray<Variant>& v) { values(node, handles, count, v); });
-    errorsTap_ = reports.Errors.subscribe([this](std::string_view, const std::string& driver,
-                                                 const std::string& from,
-                                                 const std::string& message) {
-        if (clients() == 0) return;
-        JsonWriter j;
-        j.beginObject().key("driver").string(driver).key("from").string(from);
-        j.key("message").string(message).endObject();
-        send("event: error\ndata: " + j.str() + "\n\n");
-    });
+    errorsTap_ =
+        reports.Errors.subscribe([this](std::string_view, const std::string& driver,
+                                        const std::string& from, const std::string& message) {
+            if (clients() == 0) return;
+            JsonWriter j;
+            j.beginObject().key("driver").string(driver).key("from").string(from);
+            j.key("message").string(message).endObject();
+            send("event: error\ndata: " + j.str() + "\n\n");
+        });
     linkChanges_ = links.StateChanged.subscribe([this](const LinkStatus& status) {
         if (clients() == 0) return;
         JsonWriter j;
@@ -103,15 +103,24 @@ void EventStream::values(std::string_view node, const VbArray<int32_t>& handles,
         loop_.post([this] { flushValues(); });
     }
     const int32_t n = std::min({int32_t{count}, handles.size(), v.size()});
-    // One time for the whole report: its values arrived together.
-    JsonWriter stamp;
-    stamp.time(clock_.now());
-    const std::string& time = stamp.str();
-    const std::string name = JsonWriter::Quote(node);
+    // One time for the whole report (its values arrived together); the node's name and the
+    // time are written once and reused while they stay the same, as they do within a scan.
+    const platform::DateTime now = clock_.now();
+    if (now != stampTime_ || stampJson_.empty()) {
+        JsonWriter stamp;
+        stamp.time(now);
+        stampTime_ = now;
+        stampJson_ = stamp.str();
+    }
+    if (node != stampNode_ || nodeJson_.empty()) {
+        stampNode_ = node;
+        nodeJson_ = JsonWriter::Quote(node);
+    }
     JsonWriter& j = *batch_;
     for (int32_t i = 0; i < n; ++i) {
-        j.beginObject().key("node").raw(name).key("handle").integer(handles(handles.LBound() + i));
-        j.key("value").value(v(v.LBound() + i)).key("time").raw(time).endObject();
+        j.beginObject().key("node").raw(nodeJson_);
+        j.key("handle").integer(handles(handles.LBound() + i));
+        j.key("value").value(v(v.LBound() + i)).key("time").raw(stampJson_).endObject();
     }
 }
 

@@ -79,6 +79,10 @@ class EventStream {
     const platform::Clock& clock_;
     std::vector<std::weak_ptr<Client>> clients_;
     std::optional<JsonWriter> batch_;  // the values of this loop turn, array open
+    platform::DateTime stampTime_{};
+    std::string stampJson_;  // stampTime_ as JSON
+    std::string stampNode_;
+    std::string nodeJson_;  // stampNode_ as JSON
     std::optional<platform::EventLoop::TimerId> keepAlive_;
     Subscription valuesTap_;
     Subscription errorsTap_;

@@ -51,8 +51,7 @@ struct Callbacks {
             // A body announced too large is refused before a byte of it is read.
             const char* length = MHD_lookup_connection_value(connection, MHD_HEADER_KIND,
                                                              MHD_HTTP_HEADER_CONTENT_LENGTH);
-            if (length && std::strtoull(length, nullptr, 10) > HttpServer::MaxBody)
-                return refuse();
+            if (length && std::strtoull(length, nullptr, 10) > HttpServer::MaxBody) return refuse();
             return MHD_YES;
         }
         if (*size > 0) {
@@ -101,13 +100,11 @@ HttpServer::HttpServer(platform::EventLoop& loop, const Settings& settings, Hand
         throw std::runtime_error("not an IPv4 address: " + settings.host);
 
     daemon_ = MHD_start_daemon(
-        MHD_USE_EPOLL | MHD_ALLOW_SUSPEND_RESUME, 0, nullptr, nullptr,
-        &Callbacks::Access, this,
+        MHD_USE_EPOLL | MHD_ALLOW_SUSPEND_RESUME, 0, nullptr, nullptr, &Callbacks::Access, this,
         MHD_OPTION_SOCK_ADDR, &address, MHD_OPTION_CONNECTION_LIMIT,
         static_cast<unsigned>(settings.maxConnections), MHD_OPTION_CONNECTION_TIMEOUT,
         static_cast<unsigned>(settings.idleSeconds), MHD_OPTION_CONNECTION_MEMORY_LIMIT,
-        static_cast<size_t>(32 * 1024), MHD_OPTION_NOTIFY_COMPLETED,
-        &Callbacks::Completed, this,
+        static_cast<size_t>(32 * 1024), MHD_OPTION_NOTIFY_COMPLETED, &Callbacks::Completed, this,
         MHD_OPTION_END);
     if (!daemon_)
         throw std::runtime_error("cannot listen on " + settings.host + ":" +
@@ -159,8 +156,8 @@ HttpResponse HttpServer::handle(MHD_Connection* connection, const char* url, con
     HttpRequest r;
     r.method = method;
     r.path = url;
-    if (const char* auth = MHD_lookup_connection_value(connection, MHD_HEADER_KIND,
-                                                       MHD_HTTP_HEADER_AUTHORIZATION))
+    if (const char* auth =
+            MHD_lookup_connection_value(connection, MHD_HEADER_KIND, MHD_HTTP_HEADER_AUTHORIZATION))
         r.authorization = auth;
     r.body = std::move(body);
     try {
@@ -180,9 +177,8 @@ bool HttpServer::respond(MHD_Connection* connection, const HttpResponse& respons
                                               stream, &Callbacks::FreeStream);
         MHD_add_response_header(r, MHD_HTTP_HEADER_CACHE_CONTROL, "no-cache");
     } else {
-        r = MHD_create_response_from_buffer(response.body.size(),
-                                            const_cast<char*>(response.body.data()),
-                                            MHD_RESPMEM_MUST_COPY);
+        r = MHD_create_response_from_buffer(
+            response.body.size(), const_cast<char*>(response.body.data()), MHD_RESPMEM_MUST_COPY);
         MHD_add_response_header(r, MHD_HTTP_HEADER_CACHE_CONTROL, "no-store");
     }
     if (!r) return false;

@@ -128,10 +128,14 @@ uint32_t JsonReader::hex4() {
     for (int i = 0; i < 4; ++i) {
         const char c = text_[pos_++];
         code <<= 4;
-        if (c >= '0' && c <= '9') code |= static_cast<uint32_t>(c - '0');
-        else if (c >= 'a' && c <= 'f') code |= static_cast<uint32_t>(c - 'a' + 10);
-        else if (c >= 'A' && c <= 'F') code |= static_cast<uint32_t>(c - 'A' + 10);
-        else fail("bad \\u escape");
+        if (c >= '0' && c <= '9')
+            code |= static_cast<uint32_t>(c - '0');
+        else if (c >= 'a' && c <= 'f')
+            code |= static_cast<uint32_t>(c - 'a' + 10);
+        else if (c >= 'A' && c <= 'F')
+            code |= static_cast<uint32_t>(c - 'A' + 10);
+        else
+            fail("bad \\u escape");
     }
     return code;
 }
@@ -152,15 +156,32 @@ std::string JsonReader::string() {
             if (atEnd()) fail("unterminated string");
             const char e = text_[pos_++];
             switch (e) {
-                case '"': case '\\': case '/': out += e; break;
-                case 'b': out += '\b'; break;
-                case 'f': out += '\f'; break;
-                case 'n': out += '\n'; break;
-                case 'r': out += '\r'; break;
-                case 't': out += '\t'; break;
+                case '"':
+                case '\\':
+                case '/':
+                    out += e;
+                    break;
+                case 'b':
+                    out += '\b';
+                    break;
+                case 'f':
+                    out += '\f';
+                    break;
+                case 'n':
+                    out += '\n';
+                    break;
+                case 'r':
+                    out += '\r';
+                    break;
+                case 't':
+                    out += '\t';
+                    break;
                 // A surrogate is always beyond Latin-1, so put() refuses it.
-                case 'u': put(hex4()); break;
-                default: fail("bad escape in a string");
+                case 'u':
+                    put(hex4());
+                    break;
+                default:
+                    fail("bad escape in a string");
             }
             continue;
         }

@@ -47,7 +47,7 @@ JsonWriter& JsonWriter::endArray() {
 
 JsonWriter& JsonWriter::key(std::string_view name) {
     separate();
-    out_ += Quote(name);
+    AppendQuoted(out_, name);
     out_ += ':';
     afterKey_ = true;
     return *this;
@@ -55,7 +55,7 @@ JsonWriter& JsonWriter::key(std::string_view name) {
 
 JsonWriter& JsonWriter::string(std::string_view bytes) {
     separate();
-    out_ += Quote(bytes);
+    AppendQuoted(out_, bytes);
     return *this;
 }
 
@@ -105,9 +105,14 @@ JsonWriter& JsonWriter::value(const Variant& v) {
 }
 
 std::string JsonWriter::Quote(std::string_view bytes) {
-    static constexpr char hex[] = "0123456789abcdef";
     std::string out;
     out.reserve(bytes.size() + 2);
+    AppendQuoted(out, bytes);
+    return out;
+}
+
+void JsonWriter::AppendQuoted(std::string& out, std::string_view bytes) {
+    static constexpr char hex[] = "0123456789abcdef";
     out += '"';
     for (const char c : bytes) {
         const auto b = static_cast<unsigned char>(c);
@@ -145,7 +150,6 @@ std::string JsonWriter::Quote(std::string_view bytes) {
         }
     }
     out += '"';
-    return out;
 }
 
 std::string JsonWriter::Number(const Variant& number) {

@@ -48,6 +48,8 @@ class JsonWriter {
 
   private:
     void separate();
+    // Quote's text, appended to out.
+    static void AppendQuoted(std::string& out, std::string_view bytes);
 
     std::string out_;
     // One entry per open object or array: true until its first member is written.

@@ -93,8 +93,10 @@ HttpResponse ServeApi::tags() const {
         j.key("address").string(t.row.address).key("name").string(t.row.name);
         j.key("value").value(t.value).key("type").string(t.value.typeName());
         j.key("time");
-        if (t.time) j.time(*t.time);
-        else j.null();
+        if (t.time)
+            j.time(*t.time);
+        else
+            j.null();
         j.key("changes").integer(static_cast<int64_t>(t.changes)).endObject();
     }
     return HttpResponse::Json(j.endArray().str());
@@ -102,8 +104,7 @@ HttpResponse ServeApi::tags() const {
 
 HttpResponse ServeApi::write(const HttpRequest& request, std::string_view target) {
     if (!writes_.allowed) return HttpResponse::Error(403, "writes are not allowed");
-    if (!writes_.token.empty() &&
-        !sameSecret(request.authorization, "Bearer " + writes_.token))
+    if (!writes_.token.empty() && !sameSecret(request.authorization, "Bearer " + writes_.token))
         return HttpResponse::Error(401, "a write needs Authorization: Bearer TOKEN");
 
     const size_t slash = target.rfind('/');
@@ -119,7 +120,8 @@ HttpResponse ServeApi::write(const HttpRequest& request, std::string_view target
     const TagBook::Tag* tag = tags_.find(nodeName, handle);
     const auto n = db_.getNode(nodeName);
     if (!n) return HttpResponse::Error(404, "no node named '" + nodeName + "'");
-    if (!tag) return HttpResponse::Error(404, "no tag " + std::to_string(handle) + " on " + nodeName);
+    if (!tag)
+        return HttpResponse::Error(404, "no tag " + std::to_string(handle) + " on " + nodeName);
 
     Variant value;
     bool isArray = false;
@@ -145,8 +147,10 @@ HttpResponse ServeApi::write(const HttpRequest& request, std::string_view target
     JsonWriter j;
     try {
         // The handle travels as text, as a host passes it; the node converts it.
-        if (isArray) n->WriteArray(std::to_string(handle), items);
-        else n->WriteTag(std::to_string(handle), value);
+        if (isArray)
+            n->WriteArray(std::to_string(handle), items);
+        else
+            n->WriteTag(std::to_string(handle), value);
         j.beginObject().key("ok").boolean(true).endObject();
     } catch (const VbError& e) {
         j.beginObject().key("ok").boolean(false).key("error").beginObject();

@@ -6,8 +6,7 @@
 
 namespace maroset::gateway {
 
-TagBook::TagBook(ReportTap& reports, const platform::Clock& clock,
-                 std::vector<TagTable::Row> rows)
+TagBook::TagBook(ReportTap& reports, const platform::Clock& clock, std::vector<TagTable::Row> rows)
     : clock_(clock) {
     tags_.reserve(rows.size());
     for (auto& row : rows) {

@@ -14,8 +14,9 @@ namespace maroset::gateway {
 namespace {
 
 bool hasTagsTable(platform::Database& db) {
-    auto rs = db.OpenRecordset("select name from sqlite_master where type = 'table' and "
-                               "name like 'Tags'");
+    auto rs = db.OpenRecordset(
+        "select name from sqlite_master where type = 'table' and "
+        "name like 'Tags'");
     return rs->RecordCount() > 0;
 }
 
@@ -51,8 +52,9 @@ std::vector<TagTable::Row> TagTable::Rows(const std::filesystem::path& project) 
 
 void TagTable::Add(const std::filesystem::path& project, const Row& row) {
     auto db = platform::Database::Open(project);
-    db->Execute("CREATE TABLE IF NOT EXISTS Tags (Node TEXT, Handle INTEGER, Address TEXT, "
-                "Name TEXT)");
+    db->Execute(
+        "CREATE TABLE IF NOT EXISTS Tags (Node TEXT, Handle INTEGER, Address TEXT, "
+        "Name TEXT)");
     for (const Row& existing : Rows(project)) {
         if (UCase(existing.node) == UCase(row.node) && existing.handle == row.handle)
             throw VbError(err::DuplicateKey);

@@ -37,8 +37,7 @@ std::string WebService::url() const {
 
 bool WebService::IsLoopback(const std::string& host) {
     in_addr address{};
-    return inet_pton(AF_INET, host.c_str(), &address) == 1 &&
-           (ntohl(address.s_addr) >> 24) == 127;
+    return inet_pton(AF_INET, host.c_str(), &address) == 1 && (ntohl(address.s_addr) >> 24) == 127;
 }
 
 }  // namespace maroset::gateway

@@ -126,8 +126,8 @@ void Database::Execute(const std::string& sql, const std::vector<Variant>& param
                 sqlite3_bind_double(s, index, CDbl(v));
                 break;
             case VarType::String:
-                sqlite3_bind_text(s, index, v.string().data(),
-                                  static_cast<int>(v.string().size()), SQLITE_TRANSIENT);
+                sqlite3_bind_text(s, index, v.string().data(), static_cast<int>(v.string().size()),
+                                  SQLITE_TRANSIENT);
                 break;
             default:
                 sqlite3_bind_int64(s, index, CLng(v));

@@ -215,11 +215,9 @@ void ClsDriverNuvAbDf1::NUVSerial_ReadComplete(VbArray<Variant>&) {
     if (handles.size() > 0) proc.run([&] { ReportValues(*this, handles, values); });
 }
 
-void ClsDriverNuvAbDf1::NUVSerial_Complete(const std::string& text, uint8_t level) {
-    // Link incidents are not passed on; a host commissioning the line sees them on the trace.
-    const platform::LinkTrace& trace = Runtime::current().trace();
-    if (trace.enabled())
-        trace.write(topic_, "Complete level " + std::to_string(level) + ": " + text);
+void ClsDriverNuvAbDf1::NUVSerial_Complete(const std::string&, uint8_t) {
+    // Link incidents are not passed on: the port owner has told them on the link's incidents,
+    // where a host commissioning the line sees them.
 }
 
 }  // namespace maroset

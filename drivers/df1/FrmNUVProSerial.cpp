@@ -5,7 +5,7 @@
 #include "core/Procedure.h"
 #include "core/Runtime.h"
 #include "lang/Conversions.h"
-#include "platform/LinkTrace.h"
+#include "platform/LinkText.h"
 
 namespace maroset {
 
@@ -17,8 +17,10 @@ constexpr uint8_t DLE = Df1Receiver::DLE, ETX = Df1Receiver::ETX, ENQ = Df1Recei
 // The link's internal event codes.
 constexpr int16_t kNothing = 100, kTimeOut = 101, kFrame = 102;
 
-// Received bytes kept for one trace line at most: more than the longest frame, even with every
-// byte doubled. A longer run (garbage, a DLE storm) is traced in pieces of this size.
+using platform::IncidentKind;
+
+// Received bytes kept for one incident at most: more than the longest frame, even with every
+// byte doubled. A longer run (garbage, an endless frame) is told once and counted, not kept.
 constexpr size_t kTraceChunk = 1100;
 
 std::string bytes(std::initializer_list<uint8_t> list) {
@@ -47,7 +49,9 @@ FrmNUVProSerial::FrmNUVProSerial(std::string nodeName)
 
     onComm_ = port_.OnComm.subscribe([this] { fromLoop([this] { MSComm1_OnComm(); }); });
     broken_ = port_.Broken.subscribe(
-        [this](const std::string& why) { traceLine("line broken: " + why); });
+        [this](const std::string& why) {
+            incident(IncidentKind::Closed, [&] { return "line broken: " + why; });
+        });
     scanTick_ = TmrScanRate.Tick.subscribe([this] { fromLoop([this] { TmrScanRate_Timer(); }); });
     timeOutTick_ =
         TmrCommsTimeOut.Tick.subscribe([this] { fromLoop([this] { TmrCommsTimeOut_Timer(); }); });
@@ -71,14 +75,26 @@ FrmNUVProSerial::~FrmNUVProSerial() {
 
 template <class Body>
 void FrmNUVProSerial::fromLoop(Body&& body) {
-    // A copy: the body may destroy this owner, and the name with it.
+    // Copies: the body may destroy this owner, and the names with it.
     const std::string source = nodeName_;
-    RunEventProcedure(source, std::forward<Body>(body));
+    const std::string endpoint = endpoint_;
+    RunEventProcedure(source, std::forward<Body>(body), endpoint);
 }
 
-void FrmNUVProSerial::traceLine(std::string_view text) const {
-    const platform::LinkTrace& trace = Runtime::current().trace();
-    if (trace.enabled()) trace.write(nodeName_, text);
+void FrmNUVProSerial::incident(IncidentKind kind,
+                               const platform::LinkIncident::TextSource& text) const {
+    Runtime::current().incidents().report(nodeName_, kind, endpoint_, text);
+}
+
+void FrmNUVProSerial::tellReceived(IncidentKind kind, std::string_view what) {
+    if (traced_.empty() && tracedOver_ == 0) return;
+    incident(kind, [&] {
+        std::string text = std::string(what) + platform::Hex(traced_);
+        if (tracedOver_ > 0) text += " (and " + std::to_string(tracedOver_) + " bytes not kept)";
+        return text;
+    });
+    traced_.clear();
+    tracedOver_ = 0;
 }
 
 // ---- Properties -----------------------------------------------------------------------------
@@ -163,17 +179,29 @@ void FrmNUVProSerial::CalcCRC(int16_t length, bool fromReceive) {
 // ---- Sending --------------------------------------------------------------------------------
 
 void FrmNUVProSerial::openPort() {
-    port_.PortOpen(true);
+    endpoint_ = port_.DeviceName();
+    try {
+        port_.PortOpen(true);
+    } catch (const VbError& e) {
+        incident(IncidentKind::OpenFailed, [&] {
+            return "cannot open port " + std::to_string(port_.CommPort()) + ": " + e.description();
+        });
+        throw;
+    }
+    incident(IncidentKind::Opened, [&] {
+        return "opened port " + std::to_string(port_.CommPort()) + " (" + endpoint_ + ", " +
+               port_.Settings() + ")";
+    });
 }
 
 void FrmNUVProSerial::write(std::string_view data) {
     port_.Output(data);
-    const platform::LinkTrace& trace = Runtime::current().trace();
-    if (trace.enabled()) trace.write(nodeName_, "sent " + platform::LinkTrace::Hex(data));
+    incident(IncidentKind::Sent, [&] { return "sent " + platform::Hex(data); });
 }
 
-bool FrmNUVProSerial::raiseComplete(const std::string& text, uint8_t level) {
+bool FrmNUVProSerial::raiseComplete(const std::string& text, uint8_t level, IncidentKind kind) {
     const std::weak_ptr<int> life = life_;
+    incident(kind, [&] { return "Complete level " + std::to_string(level) + ": " + text; });
     Complete.raise(text, level);
     return !life.expired();
 }
@@ -209,10 +237,10 @@ void FrmNUVProSerial::Transmiter(int16_t code) {
             proc.run([&] { ++nakRetries_; });
             if (nakRetries_ < 4) {
                 proc.run([&] { SendMessage(); });
-                proc.run([&] { raiseComplete("Receivied NAK - Resending Message", 4); });
+                proc.run([&] { raiseComplete("Receivied NAK - Resending Message", 4, IncidentKind::Retried); });
             } else {
                 proc.run([&] { busy_ = false; });
-                proc.run([&] { raiseComplete("Receivied NAK - Aborting message", 4); });
+                proc.run([&] { raiseComplete("Receivied NAK - Aborting message", 4, IncidentKind::Dropped); });
                 if (life.expired()) return;
                 proc.run([&] { awaitingReply_ = false; });
                 proc.run([&] { nakRetries_ = 0; });
@@ -223,10 +251,10 @@ void FrmNUVProSerial::Transmiter(int16_t code) {
             if (noReplyRetries_ < 4) {
                 // Only an inquiry: the frame is not sent again, and the time-out keeps running.
                 proc.run([&] { write(bytes({DLE, ENQ})); });
-                proc.run([&] { raiseComplete("No Responce - Resending Message", 4); });
+                proc.run([&] { raiseComplete("No Responce - Resending Message", 4, IncidentKind::Retried); });
             } else {
                 proc.run([&] { busy_ = false; });
-                proc.run([&] { raiseComplete("No Responce - Timed out", 4); });
+                proc.run([&] { raiseComplete("No Responce - Timed out", 4, IncidentKind::TimedOut); });
                 if (life.expired()) return;
                 proc.run([&] { noReplyRetries_ = 0; });
                 proc.run([&] { awaitingReply_ = false; });
@@ -258,12 +286,13 @@ void FrmNUVProSerial::feed(uint8_t byte) {
 }
 
 void FrmNUVProSerial::step(uint8_t cur, Procedure& proc) {
-    if (Runtime::current().trace().enabled()) {
+    if (traced_.size() < kTraceChunk) {
         traced_ += static_cast<char>(cur);
-        if (traced_.size() >= kTraceChunk) {
-            traceLine("received (part) " + platform::LinkTrace::Hex(traced_));
-            traced_.clear();
-        }
+    } else if (tracedOver_++ == 0) {
+        incident(IncidentKind::Note, [] {
+            return "receiving more than " + std::to_string(kTraceChunk) +
+                   " bytes with no frame end: counted, not kept";
+        });
     }
     rx_.feed(cur, *this, proc);
 }
@@ -279,20 +308,14 @@ void FrmNUVProSerial::stopEndOfMessage() {
 
 bool FrmNUVProSerial::frameReceived() {
     const std::weak_ptr<int> life = life_;
-    if (!traced_.empty()) {
-        traceLine("received " + platform::LinkTrace::Hex(traced_));
-        traced_.clear();
-    }
+    tellReceived(IncidentKind::Received, "received ");
     Receiver(kFrame);
     return !life.expired();
 }
 
 bool FrmNUVProSerial::controlReceived(uint8_t code) {
     const std::weak_ptr<int> life = life_;
-    if (!traced_.empty()) {
-        traceLine("received " + platform::LinkTrace::Hex(traced_));
-        traced_.clear();
-    }
+    tellReceived(IncidentKind::Received, "received ");
     if (code == ENQ)
         Receiver(ENQ);
     else
@@ -303,10 +326,10 @@ bool FrmNUVProSerial::controlReceived(uint8_t code) {
 void FrmNUVProSerial::frameStarted() {
     // Whatever came before DLE STX did not belong to a frame.
     if (traced_.size() > 2) {
-        traceLine(
-            "received (no frame) " +
-            platform::LinkTrace::Hex(std::string_view(traced_).substr(0, traced_.size() - 2)));
-        traced_.erase(0, traced_.size() - 2);
+        const std::string start = traced_.substr(traced_.size() - 2);
+        traced_.resize(traced_.size() - 2);
+        tellReceived(IncidentKind::Dropped, "received (no frame) ");
+        traced_ = start;
     }
 }
 
@@ -333,7 +356,7 @@ void FrmNUVProSerial::Receiver(int16_t code) {
                     statusText_ += std::to_string(rx_.RxBuffer(i)) + "x";
             });
             const std::weak_ptr<int> life = life_;
-            proc.run([&] { raiseComplete("Received Bad CRC " + statusText_, 3); });
+            proc.run([&] { raiseComplete("Received Bad CRC " + statusText_, 3, IncidentKind::BadCheck); });
             if (life.expired()) return;
             proc.run([&] { lastReply_ = NAK; });
             return;
@@ -344,7 +367,8 @@ void FrmNUVProSerial::Receiver(int16_t code) {
         decodeReply(proc);
     } else if (code == ENQ) {
         proc.run([&] { write(bytes({DLE, lastReply_})); });
-        proc.run([&] { raiseComplete("Received ENQ Responce: " + std::to_string(lastReply_), 3); });
+        proc.run([&] { raiseComplete("Received ENQ Responce: " + std::to_string(lastReply_), 3,
+                                     IncidentKind::Note); });
     } else {
         proc.run([&] { lastReply_ = NAK; });
     }
@@ -384,10 +408,7 @@ void FrmNUVProSerial::TmrCommsTimeOut_Timer() {
 
 void FrmNUVProSerial::TmrEndOfMessage_Timer() {
     Procedure proc(kModule, "TmrEndOfMessage_Timer");
-    if (rx_.InMessage && !traced_.empty()) {
-        traceLine("dropped a partial frame (gap over 15 ms): " + platform::LinkTrace::Hex(traced_));
-        traced_.clear();
-    }
+    if (rx_.InMessage) tellReceived(IncidentKind::Dropped, "dropped a partial frame (gap over 15 ms): ");
     proc.run([&] { rx_.InMessage = false; });
     proc.run([&] { TmrEndOfMessage.Enabled(false); });
 }
@@ -396,7 +417,7 @@ void FrmNUVProSerial::TmrWatchDog_Timer() {
     Procedure proc(kModule, "TmrWatchDog_Timer");
     if (!busy_) return;
     proc.run([&] { busy_ = false; });
-    proc.run([&] { raiseComplete("WatchDog Timeout", 4); });
+    proc.run([&] { raiseComplete("WatchDog Timeout", 4, IncidentKind::TimedOut); });
 }
 
 }  // namespace maroset

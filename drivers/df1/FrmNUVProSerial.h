@@ -9,6 +9,7 @@
 #include "lang/Subscription.h"
 #include "lang/Variant.h"
 #include "lang/VbArray.h"
+#include "platform/LinkIncident.h"
 #include "platform/Timer.h"
 #include "platform/serial/SerialPort.h"
 
@@ -33,8 +34,8 @@ namespace maroset {
 // - A gap of more than 15 ms inside a frame drops it silently. Five seconds without a byte
 //   while Busy clear Busy ("WatchDog Timeout").
 // Link incidents are raised as Complete(text, level) with the texts below, spelling
-// included; they are also written to the runtime's link trace under the node's name, with
-// every byte string sent and every frame received.
+// included; they are also told on the runtime's link incidents under the node's name, at the
+// port's device, with every byte string sent and every frame received.
 //
 // The port is opened on demand before every request, so a device that was missing or
 // unplugged is reached again by the next request. Every procedure runs under the error
@@ -136,14 +137,17 @@ class FrmNUVProSerial final : private Df1Receiver::Link {
     void decodeReply(Procedure& proc);
     // Steps one byte through the receiver, noting it for the trace.
     void step(uint8_t byte, Procedure& proc);
-    // Raises Complete; false when the owner is gone afterwards.
-    bool raiseComplete(const std::string& text, uint8_t level);
+    // Tells the incident, then raises Complete; false when the owner is gone afterwards.
+    bool raiseComplete(const std::string& text, uint8_t level, platform::IncidentKind kind);
     void write(std::string_view bytes);
     void openPort();
     // Runs a handler the loop called, so that nothing escapes into the loop.
     template <class Body>
     void fromLoop(Body&& body);
-    void traceLine(std::string_view text) const;
+    void incident(platform::IncidentKind kind,
+                  const platform::LinkIncident::TextSource& text) const;
+    // Tells the bytes received since the last incident about them, and forgets them.
+    void tellReceived(platform::IncidentKind kind, std::string_view what);
 
     // Df1Receiver::Link
     void restartEndOfMessage() override;
@@ -184,8 +188,12 @@ class FrmNUVProSerial final : private Df1Receiver::Link {
     uint8_t crcLow_ = 0;
     uint8_t crcHigh_ = 0;
     std::string statusText_;
-    // The bytes received since the last trace line about them (only while tracing).
+    // The bytes received since the last incident about them, and how many more were counted
+    // beyond what is kept.
     std::string traced_;
+    int64_t tracedOver_ = 0;
+    // The device of the port, as last opened.
+    std::string endpoint_;
 
     platform::SerialPort port_;
     Subscription onComm_, broken_, scanTick_, timeOutTick_, endTick_, watchTick_;

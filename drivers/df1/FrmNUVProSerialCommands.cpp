@@ -95,14 +95,14 @@ void FrmNUVProSerial::RefreshData() {
     // One request at a time: a poll that finds the last one unfinished only clears the flag.
     if (awaitingReply_) {
         proc.run([&] { statusText_ = "Missed poll Tx"; });
-        proc.run([&] { raiseComplete(statusText_, 3); });
+        proc.run([&] { raiseComplete(statusText_, 3, platform::IncidentKind::Dropped); });
         if (life.expired()) return;
         proc.run([&] { awaitingReply_ = false; });
         return;
     }
     if (rx_.InMessage) {
         proc.run([&] { statusText_ = "Missed poll Rx"; });
-        proc.run([&] { raiseComplete(statusText_, 3); });
+        proc.run([&] { raiseComplete(statusText_, 3, platform::IncidentKind::Dropped); });
         if (life.expired()) return;
         proc.run([&] { rx_.InMessage = false; });
         return;

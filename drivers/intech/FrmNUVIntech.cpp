@@ -8,13 +8,15 @@
 #include "lang/Conversions.h"
 #include "lang/Format.h"
 #include "lang/Strings.h"
-#include "platform/LinkTrace.h"
+#include "platform/LinkText.h"
 
 namespace maroset {
 
 namespace {
 
 constexpr const char* kModule = "FrmNUVIntech";
+
+using platform::IncidentKind;
 constexpr char kHexDigits[] = "0123456789ABCDEF";
 
 int hexDigit(char c) {
@@ -37,10 +39,6 @@ uint32_t hexValue(std::string_view digits) {
     return value;
 }
 
-const platform::LinkTrace& linkTrace() {
-    return Runtime::current().trace();
-}
-
 }  // namespace
 
 FrmNUVIntech::FrmNUVIntech()
@@ -58,7 +56,7 @@ FrmNUVIntech::FrmNUVIntech()
     comm_ = MSComm1.OnComm.subscribe([this] { onComm(); });
     broken_ = MSComm1.Broken.subscribe([this](const std::string& why) {
         // The port closed itself; the next send opens it again.
-        if (linkTrace().enabled()) linkTrace().write(traceSource(), "line broken: " + why);
+        incident(IncidentKind::Closed, [&] { return "line broken: " + why; });
     });
 }
 
@@ -153,17 +151,20 @@ std::string FrmNUVIntech::SingleToHex(float x) {
 }
 
 void FrmNUVIntech::openPort() {
+    endpoint_ = MSComm1.DeviceName();
     try {
         MSComm1.PortOpen(true);
-        openFailing_ = false;
     } catch (const VbError& e) {
-        // Shown once per run of failures; the error itself goes on to the caller.
-        if (!openFailing_ && linkTrace().enabled())
-            linkTrace().write(traceSource(), "cannot open port " + std::to_string(CommPort()) +
-                                                 ": " + e.description());
-        openFailing_ = true;
+        // The error itself goes on to the caller.
+        incident(IncidentKind::OpenFailed, [&] {
+            return "cannot open port " + std::to_string(CommPort()) + ": " + e.description();
+        });
         throw;
     }
+    incident(IncidentKind::Opened, [&] {
+        return "opened port " + std::to_string(CommPort()) + " (" + endpoint_ + ", " +
+               MSComm1.Settings() + ")";
+    });
 }
 
 void FrmNUVIntech::SendCommand(const std::string& cmd) {
@@ -177,13 +178,23 @@ void FrmNUVIntech::SendCommand(const std::string& cmd) {
         const std::string request = cmd + bcc + "\r";
         if (collector_.dropped() > 0) traceDropped();
         MSComm1.Output(request);
-        if (linkTrace().enabled())
-            linkTrace().write(traceSource(), "sent " + platform::LinkTrace::Printable(request));
+        incident(IncidentKind::Sent, [&] {
+            std::string text = "sent " + platform::Printable(request);
+            if (cmd.empty()) text += " (an empty poll entry: no tag is read by its place)";
+            return text;
+        });
     });
 }
 
 void FrmNUVIntech::pollStep(Procedure& proc) {
     std::string cmd;
+    if (PollCommand_.UBound() < 0) {
+        incident(IncidentKind::Note, [] {
+            return std::string(
+                "no poll command: the node has no tag, so each tick fails with error 9 until "
+                "one is added");
+        });
+    }
     // The list itself, not the growing accessor: before anything was registered this fails
     // with Subscript out of range and nothing is sent.
     proc.run([&] { cmd = PollCommand_(PollIndex_); });
@@ -211,15 +222,17 @@ void FrmNUVIntech::SendNextCommand() {
 void FrmNUVIntech::onTick() {
     const auto self = weak_from_this().lock();
     if (unloaded_) return;
-    const std::string source = traceSource();
-    RunEventProcedure(source, [&] { TmrScanRate_Timer(); });
+    const std::string source(traceSource());
+    const std::string endpoint = endpoint_;
+    RunEventProcedure(source, [&] { TmrScanRate_Timer(); }, endpoint);
 }
 
 void FrmNUVIntech::onComm() {
     const auto self = weak_from_this().lock();
     if (unloaded_) return;
-    const std::string source = traceSource();
-    RunEventProcedure(source, [&] { MSComm1_OnComm(); });
+    const std::string source(traceSource());
+    const std::string endpoint = endpoint_;
+    RunEventProcedure(source, [&] { MSComm1_OnComm(); }, endpoint);
 }
 
 void FrmNUVIntech::MSComm1_OnComm() {
@@ -231,20 +244,33 @@ void FrmNUVIntech::MSComm1_OnComm() {
         if (c == "@" && collector_.dropped() > 0) traceDropped();
         complete = collector_.feed(c);
     });
+    if (!collector_.cutShort().empty()) {
+        incident(IncidentKind::Dropped, [&] {
+            return "reply cut short by a new \"@\" after " +
+                   std::to_string(collector_.cutShort().size()) +
+                   " characters: " + platform::Printable(collector_.cutShort());
+        });
+        collector_.takeCutShort();
+    }
+    if (collector_.overran()) {
+        incident(IncidentKind::Dropped, [] {
+            return "reply longer than " + std::to_string(IntechCollector::FrameLimit) +
+                   " characters: dropped, waiting for the next \"@\"";
+        });
+        collector_.takeOverrun();
+    }
     if (!complete) return;
     proc.run([&] {
         // A copy: a handler further down may release this object and its buffer.
         const std::string frame = collector_.RxBuffer();
-        if (linkTrace().enabled())
-            linkTrace().write(traceSource(), "received " + platform::LinkTrace::Printable(frame));
+        incident(IncidentKind::Received, [&] { return "received " + platform::Printable(frame); });
         RXData(frame);
     });
 }
 
 bool FrmNUVIntech::acceptFrame(const std::string& frame) const {
-    const platform::LinkTrace& trace = linkTrace();
     auto reject = [&](const std::string& why) {
-        if (trace.enabled()) trace.write(traceSource(), "dropped reply: " + why);
+        incident(IncidentKind::BadCheck, [&] { return "dropped reply: " + why; });
         return false;
     };
     const size_t length = frame.size();
@@ -255,8 +281,8 @@ bool FrmNUVIntech::acceptFrame(const std::string& frame) const {
     const std::string computed = CalcBCC(std::string_view(frame).substr(0, length - 2));
     const std::string received = frame.substr(length - 2);
     if (computed != received) {
-        std::string why = "BCC mismatch (computed " + platform::LinkTrace::Printable(computed) +
-                          ", received " + platform::LinkTrace::Printable(received);
+        std::string why = "BCC mismatch (computed " + platform::Printable(computed) +
+                          ", received " + platform::Printable(received);
         if (computed.size() == 1) why += "; a sum below 16 never matches";
         return reject(why + ")");
     }
@@ -304,9 +330,8 @@ bool FrmNUVIntech::decode(const std::string& block, const std::string& body,
         return true;
     }
     // "E6" and anything else carries nothing this driver reports.
-    if (linkTrace().enabled())
-        linkTrace().write(traceSource(), "block \"" + platform::LinkTrace::Printable(block) +
-                                             "\": nothing reported");
+    incident(IncidentKind::Note,
+             [&] { return "block \"" + platform::Printable(block) + "\": nothing reported"; });
     return false;
 }
 
@@ -333,10 +358,10 @@ void FrmNUVIntech::RXData(const std::string& frame) {
         }
     } else if (code != "OK") {
         // Not an answer this driver knows: the chain stops until the next tick.
-        if (linkTrace().enabled())
-            linkTrace().write(traceSource(), "reply code \"" +
-                                                 platform::LinkTrace::Printable(code) +
-                                                 "\" unknown: polling waits for the next tick");
+        incident(IncidentKind::Refused, [&] {
+            return "reply code \"" + platform::Printable(code) +
+                   "\" unknown: polling waits for the next tick";
+        });
         return;
     }
     proc.run([&] { SendNextCommand(); });
@@ -351,20 +376,24 @@ void FrmNUVIntech::Unload() {
     if (MSComm1.PortOpen()) MSComm1.PortOpen(false);
 }
 
-std::string FrmNUVIntech::traceSource() const {
-    return NodeName_.empty() ? std::string(Caption) : NodeName_;
+std::string_view FrmNUVIntech::traceSource() const {
+    return NodeName_.empty() ? std::string_view(Caption) : std::string_view(NodeName_);
+}
+
+void FrmNUVIntech::incident(IncidentKind kind,
+                            const platform::LinkIncident::TextSource& text) const {
+    Runtime::current().incidents().report(traceSource(), kind, endpoint_, text);
 }
 
 void FrmNUVIntech::traceDropped() {
-    const platform::LinkTrace& trace = linkTrace();
-    if (trace.enabled()) {
+    incident(IncidentKind::Dropped, [&] {
         std::string text = "dropped " + std::to_string(collector_.dropped()) +
                            " characters outside a frame: " +
-                           platform::LinkTrace::Printable(collector_.droppedSample());
+                           platform::Printable(collector_.droppedSample());
         if (collector_.dropped() > static_cast<int64_t>(collector_.droppedSample().size()))
             text += "...";
-        trace.write(traceSource(), text);
-    }
+        return text;
+    });
     collector_.takeDropped();
 }
 

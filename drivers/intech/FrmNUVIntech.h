@@ -10,6 +10,7 @@
 #include "lang/Subscription.h"
 #include "lang/Variant.h"
 #include "lang/VbArray.h"
+#include "platform/LinkIncident.h"
 #include "platform/Timer.h"
 #include "platform/serial/SerialPort.h"
 
@@ -138,7 +139,10 @@ class FrmNUVIntech : public std::enable_shared_from_this<FrmNUVIntech> {
     bool acceptFrame(const std::string& frame) const;
     bool decode(const std::string& block, const std::string& body, const std::string& address,
                 VbArray<Variant>& names, VbArray<Variant>& values) const;
-    std::string traceSource() const;
+    // The node's name, or the caption before it has one.
+    std::string_view traceSource() const;
+    void incident(platform::IncidentKind kind,
+                  const platform::LinkIncident::TextSource& text) const;
     void traceDropped();
 
     std::string NodeName_;
@@ -152,7 +156,8 @@ class FrmNUVIntech : public std::enable_shared_from_this<FrmNUVIntech> {
     int32_t PollIndex_ = 0;
     IntechCollector collector_;
     bool unloaded_ = false;
-    bool openFailing_ = false;
+    // The device of the port, as last opened.
+    std::string endpoint_;
     Subscription tick_;
     Subscription comm_;
     Subscription broken_;

@@ -4,6 +4,7 @@ namespace maroset {
 
 bool IntechCollector::feed(std::string_view c) {
     if (c == "@") {
+        if (Receiving_) cutShort_.swap(RxBuffer_);
         RxBuffer_.clear();
         Receiving_ = true;
         ColonSeen_ = false;  // TrailCount is not reset here, on purpose
@@ -13,6 +14,14 @@ bool IntechCollector::feed(std::string_view c) {
         return false;
     }
     bool complete = false;
+    if (RxBuffer_.size() + c.size() > FrameLimit) {
+        RxBuffer_.clear();
+        Receiving_ = false;
+        ColonSeen_ = false;
+        overran_ = true;
+        drop(c);
+        return false;
+    }
     RxBuffer_.append(c);
     if (ColonSeen_) {
         ++TrailCount_;

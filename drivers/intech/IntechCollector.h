@@ -16,8 +16,14 @@ namespace maroset {
 // TrailCount. A new "@" restarts collection but leaves TrailCount alone: after a frame cut
 // off one character past its ":", the next frame ends one character early and fails its
 // check, and TrailCount is back at 0. That is intended.
+//
+// A frame is held up to FrameLimit characters, a few times the longest reply an instrument
+// sends: a frame that grows past it (a line that never sends its ":") is dropped, and the
+// characters up to the next "@" are dropped as outside a frame.
 class IntechCollector {
   public:
+    static constexpr size_t FrameLimit = 512;
+
     bool feed(std::string_view c);
 
     const std::string& RxBuffer() const { return RxBuffer_; }
@@ -36,6 +42,13 @@ class IntechCollector {
 
     static constexpr size_t DroppedSampleSize = 16;
 
+    // The frame a new "@" cut short, since the last takeCutShort() (empty when none).
+    const std::string& cutShort() const { return cutShort_; }
+    void takeCutShort() { cutShort_.clear(); }
+    // A frame was dropped for growing past FrameLimit, since the last takeOverrun().
+    bool overran() const { return overran_; }
+    void takeOverrun() { overran_ = false; }
+
   private:
     void drop(std::string_view c);
 
@@ -45,6 +58,8 @@ class IntechCollector {
     int16_t TrailCount_ = 0;
     int64_t dropped_ = 0;
     std::string droppedSample_;
+    std::string cutShort_;
+    bool overran_ = false;
 };
 
 }  // namespace maroset

@@ -21,6 +21,7 @@ namespace {
 constexpr const char* kModule = "ClsDriverOPC";
 constexpr const char* kDriver = "OPC Driver";
 
+using platform::IncidentKind;
 using platform::OPCGroup;
 
 // An object that a skipped statement left unset fails the statements that use it, as an
@@ -44,6 +45,17 @@ void NewValue(const Driver& from, VbArray<int32_t>& handles, int32_t numItems,
     ReportValues(from, handles, static_cast<int16_t>(numItems), values);
 }
 
+// An OPC error as the trace shows it: its code and, for a standard one, its words. Read from
+// the table, not the server: words are built only when a reader wants them.
+std::string errorWords(int32_t code) {
+    std::string words = platform::opc::HexCode(code);
+    if (auto text = platform::opc::StandardErrorText(code)) {
+        if (text->ends_with("\r\n")) text->resize(text->size() - 2);
+        words += " " + *text;
+    }
+    return words;
+}
+
 }  // namespace
 
 ClsDriverOPC::ClsDriverOPC() = default;
@@ -59,14 +71,15 @@ std::string ClsDriverOPC::traceSource() const {
 }
 
 template <class Text>
-void ClsDriverOPC::trace(Text&& text) const {
-    const platform::LinkTrace& t = Runtime::current().trace();
-    if (!t.enabled()) return;
-    try {
-        t.write(traceSource(), text());
-    } catch (const VbError&) {
-        // A line that cannot be built is not worth failing the statement for.
-    }
+void ClsDriverOPC::trace(platform::IncidentKind kind, Text&& text, std::string_view tag) const {
+    Runtime::current().incidents().report(traceSource(), kind, serverName_, tag, [&] {
+        try {
+            return std::string(text());
+        } catch (const VbError& e) {
+            // Words that cannot be built are not worth failing the statement for.
+            return "(not told: error " + std::to_string(e.number()) + ")";
+        }
+    });
 }
 
 void ClsDriverOPC::setGroup(std::shared_ptr<OPCGroup> group) {
@@ -121,7 +134,20 @@ void ClsDriverOPC::startup(std::string ServerName, std::string TopicName) {
 void ClsDriverOPC::ConnectServer(const std::string& strServerName,
                                  const std::string& strTopicName) {
     Procedure proc(kModule, "ConnectServer", Procedure::Trap::Always);
-    proc.run([&] { use(server_).Connect(strServerName); });
+    proc.run([&] {
+        serverName_ = strServerName;
+        trace(IncidentKind::Opening, [&] { return "connecting to the OPC server " + serverName_; });
+        try {
+            use(server_).Connect(strServerName);
+        } catch (const VbError& e) {
+            trace(IncidentKind::OpenFailed, [&] {
+                return "cannot connect to the OPC server " + serverName_ + ": error " +
+                       std::to_string(e.number()) + " " + e.description();
+            });
+            throw;
+        }
+        trace(IncidentKind::Opened, [&] { return "connected to the OPC server " + serverName_; });
+    });
     // The group is named after the node.
     proc.run([&] { setGroup(use(server_).OPCGroups().Add(Variant(strTopicName))); });
     proc.run([&] { use(group_).IsSubscribed(true); });
@@ -184,10 +210,9 @@ int32_t ClsDriverOPC::WriteItem(int32_t ClientHandle, const Variant& data) {
     proc.run([&] { use(group_).AsyncWrite(1, handles, values, errors, 0, cancelID); });
     // Write errors are not reported; the trace shows them.
     if (!errors.empty() && errors(1) != 0) {
-        trace([&] {
-            int32_t code = errors(1);
+        trace(IncidentKind::Refused, [&] {
             return "WriteItem handle " + std::to_string(ClientHandle) + ": " +
-                   platform::opc::HexCode(code) + " " + GetErrorString(code);
+                   errorWords(errors(1));
         });
     }
     return 0;
@@ -226,10 +251,10 @@ bool ClsDriverOPC::AddItem(const std::string& TagName, int16_t ClientHandle) {
         proc.run([&] {
             int32_t code = errors(1);
             const std::string text = GetErrorString(code);
-            trace([&] {
+            trace(IncidentKind::Refused, [&] {
                 return "AddItem " + itemIDs(1) + " (handle " + std::to_string(ClientHandle) +
                        "): " + platform::opc::HexCode(code) + " " + text;
-            });
+            }, itemIDs(1));
             ReportError(*this, kDriver, "ClsDriverOPC.AddItem", "TagName: " + TagName + " Error: " + text);
         });
     } else {
@@ -267,12 +292,10 @@ bool ClsDriverOPC::AddItems(int16_t NumItems, VbArray<std::string>& TagNames,
                 // message names no tag.
                 int32_t first = errors(1);
                 const std::string text = GetErrorString(first);
-                trace([&] {
-                    int32_t own = errors(i);
+                trace(IncidentKind::Refused, [&] {
                     return "AddItems " + itemIDs(i) + " (handle " +
-                           std::to_string(ClientHandles(i)) + "): " + platform::opc::HexCode(own) +
-                           " " + GetErrorString(own);
-                });
+                           std::to_string(ClientHandles(i)) + "): " + errorWords(errors(i));
+                }, itemIDs(i));
                 ReportError(*this, kDriver, "ClsDriverOPC.AddItems", " Error: " + text);
             });
         } else {
@@ -299,7 +322,7 @@ int32_t ClsDriverOPC::ReadItem(int32_t ClientHandle) {
         proc.run([&] {
             int32_t code = errors(1);
             const std::string text = GetErrorString(code);
-            trace([&] {
+            trace(IncidentKind::Refused, [&] {
                 return "ReadItem handle " + std::to_string(ClientHandle) + ": " +
                        platform::opc::HexCode(code) + " " + text;
             });
@@ -336,7 +359,7 @@ void ClsDriverOPC::MyOPCGroup_DataChange(int32_t, int32_t NumItems, VbArray<int3
         firstHandle = ClientHandles(1) > 0;
     });
     if (!(active && firstHandle)) {
-        trace([&] {
+        trace(IncidentKind::Dropped, [&] {
             return "DataChange " + std::to_string(NumItems) + " items dropped (" +
                    (active ? "first client handle " + std::to_string(ClientHandles(1))
                            : std::string("group inactive")) +
@@ -344,7 +367,7 @@ void ClsDriverOPC::MyOPCGroup_DataChange(int32_t, int32_t NumItems, VbArray<int3
         });
         return;
     }
-    trace([&] { return "DataChange " + std::to_string(NumItems) + " items"; });
+    trace(IncidentKind::Received, [&] { return "DataChange " + std::to_string(NumItems) + " items"; });
     // Qualities and time stamps stay here. Nothing of this driver is touched after the
     // report: a host may drop the node while it handles it.
     proc.run([&] { NewValue(*this, ClientHandles, NumItems, ItemValues); });
@@ -358,13 +381,13 @@ void ClsDriverOPC::MyOPCGroup_AsyncReadComplete(int32_t, int32_t NumItems,
     bool active = false;
     proc.run([&] { active = use(group_).IsActive(); });
     if (!active) {
-        trace([&] {
+        trace(IncidentKind::Dropped, [&] {
             return "AsyncReadComplete " + std::to_string(NumItems) +
                    " items dropped (group inactive)";
         });
         return;
     }
-    trace([&] { return "AsyncReadComplete " + std::to_string(NumItems) + " items"; });
+    trace(IncidentKind::Received, [&] { return "AsyncReadComplete " + std::to_string(NumItems) + " items"; });
     // Per-item errors are not looked at, and a failing report is ignored.
     Procedure report(kModule, "MyOPCGroup_AsyncReadComplete", Procedure::Trap::ResumeNext);
     report.run([&] { NewValue(*this, ClientHandles, NumItems, ItemValues); });
@@ -379,9 +402,9 @@ void ClsDriverOPC::MyOPCGroup_AsyncWriteComplete(int32_t, int32_t NumItems,
         proc.run([&] {
             int32_t code = Errors(i);
             if (code == 0) return;
-            trace([&] {
+            trace(IncidentKind::Refused, [&] {
                 return "AsyncWriteComplete handle " + std::to_string(ClientHandles(i)) + ": " +
-                       platform::opc::HexCode(code) + " " + GetErrorString(code);
+                       errorWords(code);
             });
         });
     }

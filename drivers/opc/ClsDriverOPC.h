@@ -3,11 +3,13 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <string_view>
 
 #include "core/Driver.h"
 #include "lang/Subscription.h"
 #include "lang/VbArray.h"
 #include "platform/Clock.h"
+#include "platform/LinkIncident.h"
 
 namespace maroset {
 
@@ -94,8 +96,10 @@ class ClsDriverOPC final : public Driver {
   private:
     void setGroup(std::shared_ptr<platform::OPCGroup> group);
     std::string traceSource() const;
+    // Tells an incident of the node's link to its server; the words are built only when a
+    // reader asks for them.
     template <class Text>
-    void trace(Text&& text) const;
+    void trace(platform::IncidentKind kind, Text&& text, std::string_view tag = {}) const;
 
     std::shared_ptr<platform::OPCServer> server_;
     std::shared_ptr<platform::OPCGroup> group_;  // MyOPCGroup
@@ -103,6 +107,8 @@ class ClsDriverOPC final : public Driver {
     int16_t maxHandle_ = 0;
     VbArray<int32_t> serverHandles_{1, 0};
     std::string topic_;
+    // The server as named to ConnectServer (program identifier or endpoint URL).
+    std::string serverName_;
     // After group_, so they go first.
     Subscription dataChange_;
     Subscription readComplete_;

@@ -86,7 +86,11 @@ void ClsDriverNUVSoftPLC::ConnectServer(const std::string&, const std::string&) 
     Procedure proc(kModule, "ConnectServer");
     proc.run([&] { requireClient().Winsock.RemoteHost(CStr(IPAddress())); });
     proc.run([&] { requireClient().Winsock.RemotePort(CLng(Port())); });
-    proc.run([&] { requireClient().Winsock.Connect(); });
+    proc.run([&] {
+        FrmNUVTCPIP& client = requireClient();
+        client.trace(platform::IncidentKind::Opening, "connecting to " + client.endpoint());
+        client.Winsock.Connect();
+    });
     // Twice, and no waiting: the connection may well not be up when this returns.
     proc.run([&] { Runtime::current().loop().pump(); });
     proc.run([&] { Runtime::current().loop().pump(); });

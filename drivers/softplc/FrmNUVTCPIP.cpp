@@ -7,7 +7,7 @@
 #include "drivers/softplc/ConcatText.h"
 #include "lang/Format.h"
 #include "lang/Strings.h"
-#include "platform/LinkTrace.h"
+#include "platform/LinkText.h"
 
 namespace maroset {
 
@@ -15,6 +15,7 @@ namespace {
 
 constexpr const char* kModule = "FrmCommClient";
 
+using platform::IncidentKind;
 using platform::TcpClient;
 
 std::string keyOf(int32_t number) {
@@ -66,9 +67,15 @@ bool FrmNUVTCPIP::connected() const {
     return Winsock.State() == TcpClient::sckConnected;
 }
 
-void FrmNUVTCPIP::trace(const std::string& text) const {
-    const platform::LinkTrace& t = Runtime::current().trace();
-    if (t.enabled()) t.write(nodeName_, platform::LinkTrace::Printable(text));
+std::string FrmNUVTCPIP::endpoint() const {
+    return Winsock.RemoteHost() + ":" + std::to_string(Winsock.RemotePort());
+}
+
+void FrmNUVTCPIP::trace(IncidentKind kind, std::string_view words, std::string_view frame) const {
+    const std::string where = endpoint();
+    Runtime::current().incidents().report(nodeName_, kind, where, [&] {
+        return std::string(words) + platform::Printable(frame);
+    });
 }
 
 void FrmNUVTCPIP::SendData(const std::string& MsgType, const Variant& data) {
@@ -85,7 +92,14 @@ void FrmNUVTCPIP::SendData(const std::string& MsgType, const Variant& data) {
             WinError("No Server Connection Available");
         }
     });
-    if (!up) return;  // the number stays used
+    if (!up) {
+        // The number stays used; the frame is lost.
+        trace(IncidentKind::Dropped,
+              "No Server Connection Available: not connected to " + endpoint() + ", lost " +
+                  MsgType + " frame " + Format(Variant(MSGNum), "000") + ": ",
+              ConcatText(data));
+        return;
+    }
     std::string frame;
     proc.run([&] { frame = MessageFrame::Build(MsgType, MSGNum, ConcatText(data)); });
     if (MsgType != "ACK" && MsgType != "NAK") {
@@ -100,7 +114,7 @@ void FrmNUVTCPIP::SendData(const std::string& MsgType, const Variant& data) {
     }
     proc.run([&] {
         if (connected()) {
-            trace("Client Send: " + frame);
+            trace(IncidentKind::Sent, "Client Send: ", frame);
             Winsock.SendData(frame);
         }
     });
@@ -109,12 +123,12 @@ void FrmNUVTCPIP::SendData(const std::string& MsgType, const Variant& data) {
     proc.run([&] { Runtime::current().loop().pump(); });
 }
 
-void FrmNUVTCPIP::WinError(const std::string& ErrMsg) {
-    trace(ErrMsg);
+void FrmNUVTCPIP::WinError(const std::string&) {
+    // Reports nothing: the caller tells what the error cost.
 }
 
 void FrmNUVTCPIP::Winsock_Connect() {
-    trace("connected99");
+    trace(IncidentKind::Opened, "connected99: connected to " + endpoint());
 }
 
 void FrmNUVTCPIP::Winsock_DataArrival(int32_t) {
@@ -122,7 +136,7 @@ void FrmNUVTCPIP::Winsock_DataArrival(int32_t) {
     Procedure proc(kModule, "Winsock_DataArrival");
     std::string text;
     proc.run([&] { text = Winsock.GetData(); });
-    trace("Client RX: " + text);
+    trace(IncidentKind::Received, "Client RX: ", text);
     ArrivalSplitter splitter;
     splitter.feed(text);
     splitter.finish();
@@ -181,11 +195,14 @@ void FrmNUVTCPIP::negativeAcknowledged(Procedure& proc) {
             if (entry->NakCount < 3) {
                 entry->AckDelayCount = 0;
                 if (connected()) {
-                    trace("Client ReSend Nak Recived: " + entry->Message);
+                    trace(IncidentKind::Retried, "Client ReSend Nak Recived: ", entry->Message);
                     Winsock.SendData(entry->Message);
                 }
                 resent = true;
             } else {
+                trace(IncidentKind::Dropped,
+                      "frame given up after " + std::to_string(entry->NakCount) + " NAKs: ",
+                      entry->Message);
                 TXQueue.Remove(keyOf(entry->MSGNum));
             }
         });
@@ -206,13 +223,15 @@ void FrmNUVTCPIP::TmrAckDelay_Timer() {
             entry->AckDelayCount = 0;
             entry->NakCount = entry->NakCount + 1;
             if (entry->NakCount > 3) {
-                trace("Client giveup no reply: " + entry->Message);
+                trace(IncidentKind::TimedOut, "Client giveup no reply: ", entry->Message);
                 TXQueue.Remove(keyOf(entry->MSGNum));
             } else if (connected()) {
-                trace("Client ReSend no reply: " + entry->Message);
+                trace(IncidentKind::Retried, "Client ReSend no reply: ", entry->Message);
                 Winsock.SendData(entry->Message);
             } else {
-                trace("Client giveup no reply: " + entry->Message);
+                // Not for want of a reply: there is no connection to resend it on.
+                trace(IncidentKind::Dropped,
+                      "frame dropped, not connected to " + endpoint() + ": ", entry->Message);
                 TXQueue.Remove(keyOf(entry->MSGNum));
             }
         });
@@ -223,12 +242,16 @@ void FrmNUVTCPIP::TmrAckDelay_Timer() {
 void FrmNUVTCPIP::Winsock_Close() {
     // The queue stays; the timer drops its entries while the socket is down.
     Procedure proc(kModule, "Winsock_Close");
+    trace(IncidentKind::Closed, "connection closed by the server at " + endpoint());
     proc.run([&] { WinSockClose.raise(); });
 }
 
 void FrmNUVTCPIP::Winsock_Error(int16_t Number, const std::string& Description) {
     Procedure proc(kModule, "Winsock_Error");
-    trace("Error: " + std::to_string(Number) + " " + Description);
+    // A reset or aborted connection was up; any other error is a connect that failed.
+    const bool lost = Number == 10053 || Number == 10054;
+    trace(lost ? IncidentKind::Closed : IncidentKind::OpenFailed,
+          "Error: " + std::to_string(Number) + " " + Description + " (" + endpoint() + ")");
     proc.run([&] { WinSockError.raise(Number, Description); });
 }
 

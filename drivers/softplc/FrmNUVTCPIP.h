@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "drivers/softplc/ClsTXMessage.h"
@@ -11,6 +12,7 @@
 #include "lang/Event.h"
 #include "lang/Subscription.h"
 #include "lang/Variant.h"
+#include "platform/LinkIncident.h"
 #include "platform/Timer.h"
 #include "platform/tcp/TcpClient.h"
 
@@ -65,6 +67,13 @@ class FrmNUVTCPIP : public std::enable_shared_from_this<FrmNUVTCPIP> {
     void TmrAckDelay_Timer();
 
     bool unloaded() const { return unloaded_; }
+
+    // "host:port" of the server.
+    std::string endpoint() const;
+    // Tells an incident of this link under the node's name: the words, then the frame shown
+    // readably.
+    void trace(platform::IncidentKind kind, std::string_view words,
+               std::string_view frame = {}) const;
     const std::string& nodeName() const { return nodeName_; }
 
     int32_t MSGNum = 0;
@@ -90,7 +99,6 @@ class FrmNUVTCPIP : public std::enable_shared_from_this<FrmNUVTCPIP> {
     void acknowledged(Procedure& proc, const std::string& payload);
     void negativeAcknowledged(Procedure& proc);
     bool connected() const;
-    void trace(const std::string& text) const;
 
     std::string nodeName_;
     bool unloaded_ = false;

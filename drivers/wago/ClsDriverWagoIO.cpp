@@ -1,5 +1,7 @@
 #include "drivers/wago/ClsDriverWagoIO.h"
 
+#include <arpa/inet.h>
+
 #include <array>
 
 #include "core/EventProcedure.h"
@@ -8,7 +10,7 @@
 #include "core/ValueReport.h"
 #include "lang/Conversions.h"
 #include "lang/Strings.h"
-#include "platform/LinkTrace.h"
+#include "platform/LinkText.h"
 
 namespace maroset {
 
@@ -16,6 +18,7 @@ namespace {
 
 constexpr const char* kModule = "ClsDriverWagoIO";
 
+using platform::IncidentKind;
 using platform::MbtLibrary;
 
 // Table types of the MBT read calls.
@@ -55,8 +58,28 @@ void yieldToPendingEvents() {
     Runtime::current().loop().pump();
 }
 
-bool tracing() {
-    return Runtime::current().trace().enabled();
+// Why a coupler address is refused before anything is sent: MBTConnect takes only a dotted
+// IPv4 address, so a host name or stray blanks fail on every pass.
+std::string addressHint(const std::string& address) {
+    in_addr parsed{};
+    if (::inet_pton(AF_INET, address.c_str(), &parsed) == 1) return {};
+    return "; IPAddress \"" + address + "\" is not a dotted IPv4 address such as 192.168.1.10";
+}
+
+// What an address of a tag makes of every scan pass, for a word at AddItem; empty when the
+// tag is read as any other.
+std::string passWarning(const std::string& prefix, int16_t address) {
+    int32_t readBack = address;
+    if (prefix == "OW")
+        readBack += kReadBackOffset;
+    else if (prefix == "OD")
+        readBack += address < kHighBitsFrom ? kReadBackOffset : kHighBitReadBackOffset;
+    else if (prefix != "IW" && prefix != "ID")
+        return "no read polls it: \"" + prefix + "\" is none of IW, OW, ID, OD";
+    if (readBack <= INT16_MAX) return {};
+    return "its read-back address " + std::to_string(readBack) +
+           " passes 32767: every scan pass stops at it with error 6 (Overflow), and the tags "
+           "after it are not read";
 }
 
 }  // namespace
@@ -77,13 +100,29 @@ std::string ClsDriverWagoIO::traceSource() const {
     return name.empty() ? topic_ : name;
 }
 
-void ClsDriverWagoIO::traceFailure(const std::string& call, int32_t status) const {
-    if (!tracing()) return;
-    std::string text = call + " failed: status " + std::to_string(status) + ", " +
-                       platform::mbt::StatusText(status);
-    const std::string& cause = mbt_.LastErrorText();
-    if (!cause.empty() && cause != platform::mbt::StatusText(status)) text += " (" + cause + ")";
-    Runtime::current().trace().write(traceSource(), text);
+void ClsDriverWagoIO::incident(IncidentKind kind, std::string_view tag,
+                               const platform::LinkIncident::TextSource& text) const {
+    Runtime::current().incidents().report(traceSource(), kind, endpoint_, tag, text);
+}
+
+void ClsDriverWagoIO::tagStopsPass(const std::string& tag, const VbError& error) const {
+    // The error alone does not say at which tag the pass ended.
+    incident(IncidentKind::Error, tag, [&] {
+        return "tag " + tag + " stops the pass: error " + std::to_string(error.number()) + " (" +
+               error.description() + ")";
+    });
+}
+
+void ClsDriverWagoIO::traceFailure(const std::string& call, int32_t status, IncidentKind kind,
+                                   std::string_view tag) const {
+    incident(kind, tag, [&] {
+        std::string text = call + " failed: status " + std::to_string(status) + ", " +
+                           platform::mbt::StatusText(status);
+        const std::string& cause = mbt_.LastErrorText();
+        if (!cause.empty() && cause != platform::mbt::StatusText(status))
+            text += " (" + cause + ")";
+        return text;
+    });
 }
 
 // --- connection ---------------------------------------------------------------------------
@@ -117,29 +156,36 @@ void ClsDriverWagoIO::connect_to_coupler() {
     std::string address;
     proc.run([&] {
         address = CStr(IPAddress());
+        endpoint_ = address + ":" + std::to_string(Runtime::current().modbusPort());
+        incident(IncidentKind::Opening, {},
+                 [&] { return "connecting to the coupler at " + endpoint_; });
         connectResult = mbt_.MBTConnect(address, CouplerPort, 0, RequestTimeout, handle_);
-        if (connectResult != 0)
-            traceFailure("MBTConnect(" + address + ", " + std::to_string(CouplerPort) + ")",
-                         connectResult);
+        if (connectResult != 0) {
+            incident(IncidentKind::OpenFailed, {}, [&] {
+                std::string text = "cannot connect to the coupler at " + endpoint_ +
+                                   ": status " + std::to_string(connectResult) + ", " +
+                                   platform::mbt::StatusText(connectResult);
+                const std::string& cause = mbt_.LastErrorText();
+                if (!cause.empty() && cause != platform::mbt::StatusText(connectResult))
+                    text += " (" + cause + ")";
+                return text + addressHint(address);
+            });
+        }
     });
     uint8_t exceptionStatus = 0;
     proc.run([&] {
         const int32_t result = mbt_.MBTReadExceptionStatus(handle_, exceptionStatus, nullptr, 0);
         status_ = Variant(result);
-        if (result != 0 && connectResult == 0) traceFailure("MBTReadExceptionStatus", result);
+        if (result != 0 && connectResult == 0)
+            traceFailure("MBTReadExceptionStatus", result, IncidentKind::OpenFailed);
     });
     proc.run([&] {
         if (connectResult == 0 && CLng(status_) == 0) {
             connected_ = true;
-            if (tracing()) {
-                Runtime::current().trace().write(
-                    traceSource(), "connected to the coupler at " + address + ":" +
-                                       std::to_string(CouplerPort) + " (TCP port " +
-                                       std::to_string(Runtime::current().modbusPort()) +
-                                       "), exception status " +
-                                       platform::LinkTrace::Hex(
-                                           std::string(1, static_cast<char>(exceptionStatus))));
-            }
+            incident(IncidentKind::Opened, {}, [&] {
+                return "connected to the coupler at " + endpoint_ + ", exception status " +
+                       platform::Hex(std::string(1, static_cast<char>(exceptionStatus)));
+            });
         }
     });
 }
@@ -158,6 +204,8 @@ void ClsDriverWagoIO::disconnect_from_coupler() {
         proc.run([&] {
             status_ = Variant(mbt_.MBTDisconnect(handle_));
             handle_ = 0;
+            incident(IncidentKind::Closed, {},
+                     [&] { return "disconnected from the coupler at " + endpoint_; });
         });
         proc.run([&] { mbt_.MBTExit(); });
     }
@@ -167,9 +215,10 @@ void ClsDriverWagoIO::disconnect_from_coupler() {
 void ClsDriverWagoIO::WagoIOError() {
     Procedure proc(kModule, "WagoIOError");
     proc.run([&] {
-        if (tracing())
-            Runtime::current().trace().write(traceSource(),
-                                             "reconnecting to the coupler at " + CStr(IPAddress()));
+        incident(IncidentKind::Note, {}, [&] {
+            return "reconnecting to the coupler at " + CStr(IPAddress()) + " (last " +
+                   endpoint_ + ")";
+        });
     });
     proc.run([&] { disconnect_from_coupler(); });
     proc.run([&] { connect_to_coupler(); });
@@ -256,7 +305,9 @@ int32_t ClsDriverWagoIO::WriteItem(int32_t ClientHandle, const Variant& data) {
                     handle_, static_cast<uint16_t>(address), 1, buffer, nullptr, 0);
                 status_ = Variant(result);
                 if (result != 0)
-                    traceFailure("MBTWriteRegisters(" + std::to_string(address) + ", 1)", result);
+                    traceFailure("writing " + name + ": MBTWriteRegisters(" +
+                                     std::to_string(address) + ", 1)",
+                                 result, IncidentKind::Refused, name);
             });
         } else if (prefix == "OD") {
             proc.run([&] {
@@ -266,7 +317,9 @@ int32_t ClsDriverWagoIO::WriteItem(int32_t ClientHandle, const Variant& data) {
                                                           1, buffer, nullptr, 0);
                 status_ = Variant(result);
                 if (result != 0)
-                    traceFailure("MBTWriteCoils(" + std::to_string(address) + ", 1)", result);
+                    traceFailure("writing " + name + ": MBTWriteCoils(" +
+                                     std::to_string(address) + ", 1)",
+                                 result, IncidentKind::Refused, name);
             });
         }
     }
@@ -308,9 +361,24 @@ bool ClsDriverWagoIO::AddItem(const std::string& TagName, int16_t ClientHandle) 
                 p.address = CInt(Variant(Mid(name, 3)));
                 p.prefix = UCase(Left(name, 2));
                 p.known = true;
-            } catch (const VbError&) {
+            } catch (const VbError& e) {
                 // Left to the scan, which fails on it each pass.
+                incident(IncidentKind::Note, name, [&] {
+                    return "tag " + name + ": \"" + Mid(name, 3) +
+                           "\" is not a tag number: every scan pass stops at it with error " +
+                           std::to_string(e.number()) + " (" + e.description() +
+                           "), and the tags after it are not read";
+                });
             }
+        } else {
+            incident(IncidentKind::Note, name, [&] {
+                return "tag \"" + name + "\": no read polls it (a name of two letters and a number)";
+            });
+        }
+        if (p.known) {
+            const std::string warning = passWarning(p.prefix, p.address);
+            if (!warning.empty())
+                incident(IncidentKind::Note, name, [&] { return "tag " + name + ": " + warning; });
         }
     });
     return false;
@@ -334,7 +402,8 @@ void ClsDriverWagoIO::FrmWagoTCP_PollTime() {
     // The tick comes from the loop: an error that leaves the pass is traced and dropped, and
     // the next tick tries again. The source is copied: the pass may destroy the driver.
     const std::string source = traceSource();
-    RunEventProcedure(source, [this] { scan(); });
+    const std::string endpoint = endpoint_;
+    RunEventProcedure(source, [this] { scan(); }, endpoint);
 }
 
 int16_t ClsDriverWagoIO::readTag(const std::string& prefix, int16_t address, bool& matched) {
@@ -366,10 +435,12 @@ int16_t ClsDriverWagoIO::readTag(const std::string& prefix, int16_t address, boo
                                ? mbt_.MBTReadRegisters(handle_, table, wire, 1, buffer, nullptr, 0)
                                : mbt_.MBTReadCoils(handle_, table, wire, 1, buffer, nullptr, 0);
     status_ = Variant(result);
-    if (result != 0 && tracing()) {
-        traceFailure(std::string(registers ? "MBTReadRegisters(" : "MBTReadCoils(") +
+    if (result != 0) {
+        const std::string tag = prefix + std::to_string(address);
+        traceFailure("reading " + tag + ": " +
+                         (registers ? "MBTReadRegisters(" : "MBTReadCoils(") +
                          std::to_string(table) + ", " + std::to_string(wire) + ", 1)",
-                     result);
+                     result, IncidentKind::Refused, tag);
     }
     // Every register goes through the swap; a bit is already the value.
     return registers ? swapWord(fromBuffer(buffer)) : fromBuffer(buffer);
@@ -405,7 +476,14 @@ void ClsDriverWagoIO::scan() {
             std::string name;
             proc.run([&] { name = CStr(tagNames_(i)); });
             if (name.size() <= 1) continue;
-            proc.run([&] { address = CInt(Variant(Mid(name, 3))); });
+            proc.run([&] {
+                try {
+                    address = CInt(Variant(Mid(name, 3)));
+                } catch (const VbError& e) {
+                    tagStopsPass(name, e);
+                    throw;
+                }
+            });
             proc.run([&] { prefix = UCase(Left(name, 2)); });
         }
 
@@ -413,7 +491,14 @@ void ClsDriverWagoIO::scan() {
         int16_t value = 0;
         bool matched = false;
         proc.run([&] { status_ = Variant(int32_t{0}); });
-        proc.run([&] { value = readTag(prefix, address, matched); });
+        proc.run([&] {
+            try {
+                value = readTag(prefix, address, matched);
+            } catch (const VbError& e) {
+                tagStopsPass(prefix + std::to_string(address), e);
+                throw;
+            }
+        });
 
         bool failed = false;
         proc.run([&] { failed = matched && CLng(status_) != 0; });

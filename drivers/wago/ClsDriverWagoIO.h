@@ -3,12 +3,15 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "core/Driver.h"
 #include "drivers/wago/FrmWagoTCP.h"
 #include "lang/Subscription.h"
 #include "lang/VbArray.h"
+#include "lang/VbError.h"
+#include "platform/LinkIncident.h"
 #include "platform/mbt/MbtLibrary.h"
 
 namespace maroset {
@@ -96,7 +99,11 @@ class ClsDriverWagoIO final : public Driver {
     void releaseUnusedConnection();
 
     std::string traceSource() const;
-    void traceFailure(const std::string& call, int32_t status) const;
+    void incident(platform::IncidentKind kind, std::string_view tag,
+                  const platform::LinkIncident::TextSource& text) const;
+    void traceFailure(const std::string& call, int32_t status, platform::IncidentKind kind,
+                      std::string_view tag = {}) const;
+    void tagStopsPass(const std::string& tag, const VbError& error) const;
 
     // Expires when the driver goes: a pass or a connect that yielded checks it before it goes
     // on, since a handler may have destroyed the driver meanwhile.
@@ -105,6 +112,8 @@ class ClsDriverWagoIO final : public Driver {
     platform::MbtLibrary::Handle handle_ = 0;
     Variant status_;
     bool connected_ = false;
+    // "address:port" of the coupler as last connected to (the port actually used).
+    std::string endpoint_;
     int16_t tagCount_ = 0;
     VbArray<Variant> tagNames_;
     VbArray<int16_t> clientHandles_;

@@ -149,8 +149,8 @@ TEST_F(HostCommands, RefusedCommandsAreErrorRepliesAndTheSessionGoesOn) {
     for (const auto& [lines, number] : refused) {
         for (const auto& line : lines) {
             input += line + "\n";
-            expected.push_back(failure(line.substr(0, line.find(' ')), number,
-                                       number == 91 ? "Nope" : ""));
+            expected.push_back(
+                failure(line.substr(0, line.find(' ')), number, number == 91 ? "Nope" : ""));
         }
     }
     expected.insert(expected.end(), {valueChange("7", "1"), reply("write"), reply("quit")});
@@ -160,18 +160,19 @@ TEST_F(HostCommands, RefusedCommandsAreErrorRepliesAndTheSessionGoesOn) {
 TEST_F(HostCommands, CommandsRunInOrderAndQuitIgnoresTheRest) {
     // Command words ignore letter case, blank and comment lines are skipped, the handle goes to
     // the node as text, an array write is not reported back; nodes come and go.
-    EXPECT_EQ(memSession("start\nsleep 50\nWRITE Mem 0007 1\r\n\n# note\n  \r\n"
-                         "writearray Mem 7 1 2.5 \"x y\" true\nstop\n"
-                         "addnode Extra MemTag Topic 250 3\naddnode extra MEMTAG\nnodes\n"
-                         "removenode Mem\nremovenode Mem\nwrite Mem 7 1\nremoveall\nnodes\n"
-                         "quit\nwrite Mem 7 2\n"),
-              (Lines{reply("load"), reply("add"), reply("start"), reply("sleep"),
-                     valueChange("7", "1"), reply("write"), reply("writearray"), reply("stop"),
-                     reply("addnode"), failure("addnode", 457, "extra"),
-                     nodesReply("{\"name\":\"Mem\",\"driver\":\"MEMTAG\"},"
-                                "{\"name\":\"Extra\",\"driver\":\"MemTag\"}"),
-                     reply("removenode"), failure("removenode", 5, "Mem"), failure("write", 91, "Mem"),
-                     reply("removeall"), nodesReply(""), reply("quit")}));
+    EXPECT_EQ(
+        memSession("start\nsleep 50\nWRITE Mem 0007 1\r\n\n# note\n  \r\n"
+                   "writearray Mem 7 1 2.5 \"x y\" true\nstop\n"
+                   "addnode Extra MemTag Topic 250 3\naddnode extra MEMTAG\nnodes\n"
+                   "removenode Mem\nremovenode Mem\nwrite Mem 7 1\nremoveall\nnodes\n"
+                   "quit\nwrite Mem 7 2\n"),
+        (Lines{reply("load"), reply("add"), reply("start"), reply("sleep"), valueChange("7", "1"),
+               reply("write"), reply("writearray"), reply("stop"), reply("addnode"),
+               failure("addnode", 457, "extra"),
+               nodesReply("{\"name\":\"Mem\",\"driver\":\"MEMTAG\"},"
+                          "{\"name\":\"Extra\",\"driver\":\"MemTag\"}"),
+               reply("removenode"), failure("removenode", 5, "Mem"), failure("write", 91, "Mem"),
+               reply("removeall"), nodesReply(""), reply("quit")}));
 }
 
 TEST_F(HostCommands, EventsAndRepliesAreReadableLinesWithoutJson) {
@@ -225,17 +226,21 @@ class HostStatus : public HostFixture {
 };
 
 TEST_F(HostStatus, StatusTellsTheLinksAndAnErrorAboutANodeNamesIt) {
-    const auto lines =
-        RunCli(runArgs(), "add Mem 1 A\nwrite Mem 1 5\nstatus\nstatus opc\nstatus Pump\n"
-                          "read Pump 1\nwrite Mem x 1\nnodes extra\n")
-            .lines;
+    const auto lines = RunCli(runArgs(),
+                              "add Mem 1 A\nwrite Mem 1 5\nstatus\nstatus opc\nstatus Pump\n"
+                              "read Pump 1\nwrite Mem x 1\nnodes extra\n")
+                           .lines;
     ASSERT_EQ(lines.size(), 11u);
     const std::string& all = lines[4];
-    EXPECT_EQ(all.rfind(R"({"reply":"status","ok":true,"nodes":[{"name":"Mem","driver":"MEMTAG","link":{"state":"local","since":")", 0),
-              0u)
+    EXPECT_EQ(
+        all.rfind(
+            R"({"reply":"status","ok":true,"nodes":[{"name":"Mem","driver":"MEMTAG","link":{"state":"local","since":")",
+            0),
+        0u)
         << all;
     EXPECT_NE(all.find(R"("values":1,"driverErrors":0},"last":null}})"), std::string::npos) << all;
-    EXPECT_NE(all.find(R"({"name":"Opc","driver":"OPC","link":{"state":"down",)"), std::string::npos);
+    EXPECT_NE(all.find(R"({"name":"Opc","driver":"OPC","link":{"state":"down",)"),
+              std::string::npos);
     EXPECT_NE(all.find(R"("last":{"text":"did not start: error )"), std::string::npos) << all;
 
     EXPECT_EQ(lines[5].rfind(R"({"reply":"status","ok":true,"nodes":[{"name":"Opc",)", 0), 0u);

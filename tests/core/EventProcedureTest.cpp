@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "support/RuntimeFixture.h"
+#include "support/IncidentRecorder.h"
 
 namespace maroset {
 namespace {
@@ -14,8 +15,8 @@ using EventProcedureEdge = test::RuntimeFixture;
 
 TEST_F(EventProcedureEdge, AnErrorLeavingAnEventProcedureIsTracedAndGoesNoFurther) {
     RunEventProcedure("Plc", [] { throw VbError(8002, "Cannot open serial device /dev/x"); });
-    std::vector<std::string> lines;
-    runtime().trace().setSink([&](std::string_view l) { lines.emplace_back(l); });
+    test::IncidentRecorder incidents;
+    const std::vector<std::string>& lines = incidents.lines;
     RunEventProcedure("Plc", [] { throw VbError(9, {}, "Maroset.FrmNUVProSerial"); });
     bool ran = false;
     RunEventProcedure("Plc", [&] { ran = true; });

@@ -12,6 +12,7 @@
 #include "sim/df1/Df1Simulator.h"
 #include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
+#include "support/IncidentRecorder.h"
 
 namespace maroset::test {
 namespace {
@@ -107,9 +108,8 @@ TEST_F(Df1Node, WritesGoOutAtOnceAndAnUnknownHandleWritesToTheLastPolledAddress)
 }
 
 TEST_F(Df1Node, LinkFaultsStayInsideAndTheNextPollRecovers) {
-    platform::LinkTrace& trace = runtime().trace();
-    std::vector<std::string> lines;
-    trace.setSink([&](std::string_view line) { lines.emplace_back(line); });
+    test::IncidentRecorder incidents;
+    const std::vector<std::string>& lines = incidents.lines;
     plc->AddTag(1, "N7:1");
     sim.setWord("N7:1", 11);
     sim.nakNext(4);
@@ -137,8 +137,8 @@ TEST_F(Df1Node, LinkFaultsStayInsideAndTheNextPollRecovers) {
 }
 
 TEST_F(Df1Node, UsesPortOneAndItsOwnMappingAndRetriesADeadPortOnEveryPoll) {
-    std::vector<std::string> lines;
-    runtime().trace().setSink([&](std::string_view line) { lines.emplace_back(line); });
+    test::IncidentRecorder incidents;
+    const std::vector<std::string>& lines = incidents.lines;
     plc->SerialPort = Variant(int16_t{4});  // held only
     runtime().mapSerialPort(1, "/dev/plc-adapter", "plc");
     plc->AddTag(1, "N7:0");

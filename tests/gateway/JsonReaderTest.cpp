@@ -35,9 +35,33 @@ TEST(JsonReader, ReadsEveryKindOfValue) {
 }
 
 TEST(JsonReader, RefusesWhatIsNotJson) {
-    for (const std::string& text : std::vector<std::string>{"", " ", "{", "[1,]", "{\"a\":1,}", "{a:1}", "01", "1.", ".5", "-", "1e", "+1", "tru",
-          "nul", "\"abc", "\"\\x\"", "\"\\u12\"", "\"a\tb\"", "[1 2]", "{\"a\" 1}", "1 2",
-          "1e999", std::string("\"\0\"", 3), "\"\xC3\"", "\"\xC3(\"", "\"\x80\"", "\"\xC0\xA0\""}) {
+    for (const std::string& text : std::vector<std::string>{"",
+                                                            " ",
+                                                            "{",
+                                                            "[1,]",
+                                                            "{\"a\":1,}",
+                                                            "{a:1}",
+                                                            "01",
+                                                            "1.",
+                                                            ".5",
+                                                            "-",
+                                                            "1e",
+                                                            "+1",
+                                                            "tru",
+                                                            "nul",
+                                                            "\"abc",
+                                                            "\"\\x\"",
+                                                            "\"\\u12\"",
+                                                            "\"a\tb\"",
+                                                            "[1 2]",
+                                                            "{\"a\" 1}",
+                                                            "1 2",
+                                                            "1e999",
+                                                            std::string("\"\0\"", 3),
+                                                            "\"\xC3\"",
+                                                            "\"\xC3(\"",
+                                                            "\"\x80\"",
+                                                            "\"\xC0\xA0\""}) {
         EXPECT_THROW(JsonReader::Parse(text), JsonReader::Error) << text;
     }
 }

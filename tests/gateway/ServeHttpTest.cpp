@@ -107,10 +107,12 @@ TEST_F(ServeHttp, NodesTagsMetricsAndThePageAnswerAsDocumented) {
     EXPECT_NE(metrics.headers.find("text/plain; version=0.0.4"), std::string::npos);
     EXPECT_NE(metrics.body.find("maroset_values_total{node=\"Mem\",driver=\"MEMTAG\"} 0\n"),
               std::string::npos);
-    EXPECT_NE(metrics.body.find("maroset_link_state{node=\"Mem\",driver=\"MEMTAG\",state=\"local\"} 1\n"),
-              std::string::npos);
-    EXPECT_NE(metrics.body.find("maroset_link_state{node=\"Mem\",driver=\"MEMTAG\",state=\"up\"} 0\n"),
-              std::string::npos);
+    EXPECT_NE(
+        metrics.body.find("maroset_link_state{node=\"Mem\",driver=\"MEMTAG\",state=\"local\"} 1\n"),
+        std::string::npos);
+    EXPECT_NE(
+        metrics.body.find("maroset_link_state{node=\"Mem\",driver=\"MEMTAG\",state=\"up\"} 0\n"),
+        std::string::npos);
 
     const auto page = http.request("GET", "/");
     ASSERT_EQ(page.status, 200);
@@ -135,7 +137,8 @@ TEST_F(ServeHttp, AWriteReachesTheNodeAndShowsInTheTagsAndTheMetrics) {
     EXPECT_EQ(tags.items[1].member("value")->text, "caf\xE9");
     EXPECT_EQ(tags.items[1].member("type")->text, "String");
     EXPECT_EQ(tags.items[1].member("changes")->number, 2);
-    EXPECT_NE(http.request("GET", "/metrics").body.find("maroset_values_total{node=\"Mem\",driver=\"MEMTAG\"} 3\n"),
+    EXPECT_NE(http.request("GET", "/metrics")
+                  .body.find("maroset_values_total{node=\"Mem\",driver=\"MEMTAG\"} 3\n"),
               std::string::npos);
 }
 
@@ -147,16 +150,16 @@ TEST_F(ServeHttp, WritesAreRefusedUnlessAllowedAndAuthorised) {
 
     auto& guarded = serve(writable("s3cret"));
     EXPECT_EQ(guarded.request("POST", "/api/tags/Mem/1", R"({"value":1})").status, 401);
-    EXPECT_EQ(guarded
-                  .request("POST", "/api/tags/Mem/1", R"({"value":1})",
-                           {"Authorization: Bearer s3cre"})
-                  .status,
-              401);
-    EXPECT_EQ(guarded
-                  .request("POST", "/api/tags/Mem/1", R"({"value":1})",
-                           {"Authorization: Bearer s3cret"})
-                  .body,
-              R"({"ok":true})");
+    EXPECT_EQ(
+        guarded
+            .request("POST", "/api/tags/Mem/1", R"({"value":1})", {"Authorization: Bearer s3cre"})
+            .status,
+        401);
+    EXPECT_EQ(
+        guarded
+            .request("POST", "/api/tags/Mem/1", R"({"value":1})", {"Authorization: Bearer s3cret"})
+            .body,
+        R"({"ok":true})");
     // Reads never need the token.
     EXPECT_EQ(guarded.request("GET", "/api/tags").status, 200);
 }
@@ -194,8 +197,9 @@ TEST_F(ServeHttp, BadRequestsGetTheirStatusWithAJsonError) {
     EXPECT_EQ(refusal(http.request("GET", "/api/tags/Mem/1")), "405 method not allowed");
     EXPECT_EQ(http.request("DELETE", "/api/nodes").status, 405);
 
-    for (const char* body : {"", "{", R"({"value":})", R"({"value":1} x)", "[1]", R"({"v":1})",
-                             R"({"value":{"a":1}})", R"({"value":"\u20ac"})", "{\"value\":\"\xff\"}"}) {
+    for (const char* body :
+         {"", "{", R"({"value":})", R"({"value":1} x)", "[1]", R"({"v":1})", R"({"value":{"a":1}})",
+          R"({"value":"\u20ac"})", "{\"value\":\"\xff\"}"}) {
         const auto r = http.request("POST", "/api/tags/Mem/1", body);
         EXPECT_EQ(r.status, 400) << body;
         EXPECT_EQ(json(r).member("error")->member("status")->number, 400) << body;
@@ -222,7 +226,8 @@ TEST_F(ServeHttp, TheEventStreamDeliversTheValuesOfOneLoopTurnAsOneEvent) {
     const auto at = got.find("event: values\ndata: [");
     ASSERT_NE(at, std::string::npos) << got;
     EXPECT_NE(got.find(R"({"node":"Mem","handle":1,"value":7,"time":")", at), std::string::npos);
-    EXPECT_NE(got.find(R"({"node":"Mem","handle":2,"value":false,"time":")", at), std::string::npos);
+    EXPECT_NE(got.find(R"({"node":"Mem","handle":2,"value":false,"time":")", at),
+              std::string::npos);
     EXPECT_EQ(got.find("event: values", at + 1), std::string::npos) << "one event for the turn";
 
     // Later values come as they happen, to a stream that sat idle in between.

@@ -45,8 +45,8 @@ TEST_F(TagTableTest, RowsAreAddedListedAndRemovedWithTheirNames) {
     EXPECT_FALSE(TagTable::Remove(project_, "Mem", 8));
     EXPECT_FALSE(TagTable::Remove(project_, "Mem", 9));
     ASSERT_EQ(TagTable::Rows(project_).size(), 2u);
-    EXPECT_EQ(platform::Database::Open(project_)->OpenRecordset("select * from Nodes")->RecordCount(),
-              1);
+    EXPECT_EQ(
+        platform::Database::Open(project_)->OpenRecordset("select * from Nodes")->RecordCount(), 1);
 }
 
 TEST_F(TagTableTest, BadRowsAreToldOneLineEachAndTheRestAreRegistered) {
@@ -54,15 +54,15 @@ TEST_F(TagTableTest, BadRowsAreToldOneLineEachAndTheRestAreRegistered) {
     nodeDB& db = *host.nodeDB();
     db.AddAllNodes(project_.string());
     std::vector<std::string> bad;
-    const auto registered = TagTable::Register(
-        db,
-        {{"Mem", 1, "A", "A"},
-         {"Pump", 2, "B", "B"},
-         {"Mem", 0, "C", "C"},
-         {"Mem", 32768, "D", "D"},
-         {"mem", 1, "E", "E"},
-         {"Mem", 32767, "F", "F"}},
-        [&](const std::string& line) { bad.push_back(line); });
+    const auto registered =
+        TagTable::Register(db,
+                           {{"Mem", 1, "A", "A"},
+                            {"Pump", 2, "B", "B"},
+                            {"Mem", 0, "C", "C"},
+                            {"Mem", 32768, "D", "D"},
+                            {"mem", 1, "E", "E"},
+                            {"Mem", 32767, "F", "F"}},
+                           [&](const std::string& line) { bad.push_back(line); });
     ASSERT_EQ(registered.size(), 2u);
     EXPECT_EQ(registered[0].address, "A");
     EXPECT_EQ(registered[1].address, "F");
@@ -96,8 +96,8 @@ TEST_F(TagTableTest, AHandleThatIsNoNumberIsReportedNotRegistered) {
     ClsNodeDBInterface host;
     host.nodeDB()->AddAllNodes(project_.string());
     std::vector<std::string> bad;
-    const auto registered = TagTable::Register(*host.nodeDB(), rows,
-                                               [&](const std::string& l) { bad.push_back(l); });
+    const auto registered =
+        TagTable::Register(*host.nodeDB(), rows, [&](const std::string& l) { bad.push_back(l); });
     ASSERT_EQ(registered.size(), 1u);
     EXPECT_EQ(registered[0].name, "Named");
     EXPECT_EQ(bad.size(), 2u);

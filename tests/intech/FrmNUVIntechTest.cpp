@@ -9,6 +9,7 @@
 #include "IntechFrames.h"
 #include "platform/serial/MemorySerialCable.h"
 #include "support/ErrorOf.h"
+#include "support/IncidentRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
@@ -23,7 +24,6 @@ class IntechLine : public test::RuntimeFixture {
   protected:
     IntechLine() {
         runtime().serialDevices().plug("/dev/ttyS0", cable.hostEnd());
-        runtime().trace().setSink([this](std::string_view l) { trace.emplace_back(l); });
         frm->NodeName("Meter");
         frm->TmrScanRate.Interval(100);
         reads_ = frm->ReadComplete.subscribe([this](VbArray<Variant>& n, VbArray<Variant>& v) {
@@ -55,7 +55,8 @@ class IntechLine : public test::RuntimeFixture {
     platform::MemorySerialCable cable{loop()};
     std::shared_ptr<FrmNUVIntech> frm = std::make_shared<FrmNUVIntech>();
     std::vector<std::vector<Variant>> names, values;
-    std::vector<std::string> trace;
+    test::IncidentRecorder incidents_;
+    std::vector<std::string>& trace = incidents_.lines;
     const std::string ok = WithBcc("@01OK:") + "\r";
 
   private:

@@ -17,6 +17,7 @@
 #include "platform/opc/SimulationServer.h"
 #include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
+#include "support/IncidentRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
@@ -61,7 +62,6 @@ class OpcDriver : public test::RuntimeFixture {
     OpcDriver() {
         runtime().opcServers().Register("Maroset.Simulation", sim);
         runtime().opcServers().Register("Test.Recorder", recorder);
-        runtime().trace().setSink([this](std::string_view l) { traced.emplace_back(l); });
     }
     std::shared_ptr<node> makeNode(const char* server = "Maroset.Simulation",
                                    const Variant& prefix = Variant::Null(),
@@ -103,7 +103,8 @@ class OpcDriver : public test::RuntimeFixture {
         std::make_shared<platform::SimulationServer>(loop(), runtime().clock());
     std::shared_ptr<RecordingServer> recorder = std::make_shared<RecordingServer>(sim);
     test::HostRecorder host;
-    Lines traced;
+    test::IncidentRecorder incidents_;
+    std::vector<std::string>& traced = incidents_.lines;
 };
 
 TEST_F(OpcDriver, StartupConnectsOnceAndShutdownLeavesItConnected) {

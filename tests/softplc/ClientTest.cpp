@@ -8,6 +8,7 @@
 
 #include "sim/softplc/ServerFrames.h"
 #include "support/ErrorOf.h"
+#include "support/IncidentRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
@@ -27,7 +28,6 @@ class SoftPlcClient : public test::RuntimeFixture {
                                  link = l;
                                  l->serverEnd()->listen({{}, {}, [](std::string_view) {}, {}, {}});
                              });
-        runtime().trace().setSink([this](std::string_view line) { trace.emplace_back(line); });
         form = FrmNUVTCPIP::Create("PLC1");
         arrivals =
             form->DataArrival.subscribe([this](const std::string& type, const std::string& payload,
@@ -45,7 +45,6 @@ class SoftPlcClient : public test::RuntimeFixture {
         advance(milliseconds(0));
     }
 
-    ~SoftPlcClient() override { runtime().trace().setSink({}); }
 
     // Lets the first tick of the acknowledgement timer pass: it finds the queue empty and
     // stops the timer, so the next send starts its count afresh.
@@ -67,7 +66,8 @@ class SoftPlcClient : public test::RuntimeFixture {
     std::shared_ptr<platform::MemoryTcpLink> link;
     std::shared_ptr<FrmNUVTCPIP> form;
     std::vector<std::string> delivered;
-    std::vector<std::string> trace;
+    test::IncidentRecorder incidents_;
+    std::vector<std::string>& trace = incidents_.lines;
     std::vector<std::string> socketErrors;
     int closed = 0;
     std::function<void()> onArrival;
@@ -99,7 +99,10 @@ TEST_F(SoftPlcClient, NumbersEveryFrameFromOneAckAndNakIncludedAndWrapsAfter999)
     form->SendData("RSL", Variant(" "));
     EXPECT_EQ(form->MSGNum, 2);
     EXPECT_EQ(form->TXQueue.Count(), queued);
-    EXPECT_EQ(trace.back(), "PLC1: No Server Connection Available");
+    EXPECT_EQ(trace.back(),
+              "PLC1: No Server Connection Available: not connected to plc:5000, lost RSL frame "
+              "002:  ")
+        << "the line names the address and the frame lost";
 }
 
 TEST_F(SoftPlcClient, ANumberStillWaitingWhenItComesRoundAgainFailsTheSendWith457) {
@@ -220,7 +223,7 @@ TEST_F(SoftPlcClient, ShortPiecesBadChecksAndDelimitersInsideDataAreEachNaked) {
     fromServer(frame("NTV", 3, "1;~5;~a%>b"));  // the receiver splits inside the data
     EXPECT_EQ(wire(), frame("NAK", 3, " ") + frame("NAK", 4, " "));
     EXPECT_TRUE(delivered.empty());
-    EXPECT_EQ(trace.front(), "PLC1: connected99");
+    EXPECT_EQ(trace.front(), "PLC1: connected99: connected to plc:5000");
     EXPECT_EQ(trace[1], "PLC1: Client RX: <%x%>%>");
 }
 
@@ -245,7 +248,9 @@ TEST_F(SoftPlcClient, ARefusedConnectIsRaisedWithTheSocketsNumberAndText) {
     advance(milliseconds(0));
     EXPECT_EQ(form->Winsock.State(), platform::TcpClient::sckError);
     EXPECT_EQ(socketErrors, std::vector<std::string>{"10061 Connection is forcefully rejected"});
-    EXPECT_EQ(trace.back(), "PLC1: Error: 10061 Connection is forcefully rejected");
+    EXPECT_EQ(trace.back(), "PLC1: Error: 10061 Connection is forcefully rejected (plc:5000)");
+    EXPECT_EQ(incidents_.entries.back().kind, platform::IncidentKind::OpenFailed);
+    EXPECT_EQ(incidents_.entries.back().endpoint, "plc:5000");
     EXPECT_EQ(test::errorOf([&] { form->Winsock.Connect(); }), 40020) << "closed first";
 }
 

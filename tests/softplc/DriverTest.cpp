@@ -12,6 +12,7 @@
 #include "sim/softplc/ServerFrames.h"
 #include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
+#include "support/IncidentRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
@@ -28,14 +29,12 @@ class SoftPlcDriver : public test::RuntimeFixture {
     SoftPlcDriver() {
         runtime().tcp().setRealSockets(false);
         plug();
-        runtime().trace().setSink([this](std::string_view line) { trace.emplace_back(line); });
         db().AddAllNodes(test::SoftPlcProject(driveRoot() / "project.db",
                                               "('PLC1', 'nuvtcpip', 1000, 'plc', 5000)"));
         plc = db().getNode("PLC1");
     }
 
     // The nodes shut down with the runtime, after this fixture's members are gone.
-    ~SoftPlcDriver() override { runtime().trace().setSink({}); }
 
     void plug(milliseconds connectDelay = milliseconds(0)) {
         runtime().tcp().plug(
@@ -76,7 +75,8 @@ class SoftPlcDriver : public test::RuntimeFixture {
     std::shared_ptr<platform::MemoryTcpLink> link;
     int connections = 0;
     sim::ServerFrameReader reader;
-    std::vector<std::string> trace;
+    test::IncidentRecorder incidents_;
+    std::vector<std::string>& trace = incidents_.lines;
 };
 
 TEST_F(SoftPlcDriver, ConnectsAtLoadAndSubscribesEveryTagOnActivation) {
@@ -199,7 +199,9 @@ TEST_F(SoftPlcDriver, ASubscriptionSentBeforeTheReconnectIsUpIsLostUntilTheNextT
     advance(milliseconds(0));
     plug(milliseconds(200));
     db().StartScanning();
-    EXPECT_EQ(trace.back(), "PLC1: No Server Connection Available");
+    EXPECT_EQ(trace.back(),
+              "PLC1: No Server Connection Available: not connected to plc:5000, lost TSL frame "
+              "001: 1000;~0");
     advance(milliseconds(200));
     EXPECT_EQ(connections, 2);
     EXPECT_EQ(frames(), Frames{});

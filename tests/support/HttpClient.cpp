@@ -13,6 +13,23 @@ namespace maroset::test {
 
 using namespace std::chrono_literals;
 
+namespace {
+
+// Appends what the socket holds now; true once the peer has closed (or the socket failed).
+bool readAvailable(int fd, std::string& into) {
+    char buffer[65536];
+    for (;;) {
+        const ssize_t n = ::recv(fd, buffer, sizeof buffer, 0);
+        if (n > 0) {
+            into.append(buffer, static_cast<size_t>(n));
+            continue;
+        }
+        return n == 0 || errno != EAGAIN;
+    }
+}
+
+}  // namespace
+
 bool HttpClient::runUntil(const std::function<bool()>& done, std::chrono::milliseconds limit) {
     const auto deadline = loop_.now() + limit;
     while (!done() && loop_.now() < deadline) loop_.runFor(2ms);
@@ -35,8 +52,10 @@ int HttpClient::connectAndSend(const std::string& text) {
     size_t sent = 0;
     runUntil([&] {
         const ssize_t n = ::send(fd, text.data() + sent, text.size() - sent, MSG_NOSIGNAL);
-        if (n > 0) sent += static_cast<size_t>(n);
-        else if (n < 0 && errno != EAGAIN) return true;  // the server closed: read its answer
+        if (n > 0)
+            sent += static_cast<size_t>(n);
+        else if (n < 0 && errno != EAGAIN)
+            return true;  // the server closed: read its answer
         return sent == text.size();
     });
     return fd;
@@ -45,26 +64,15 @@ int HttpClient::connectAndSend(const std::string& text) {
 HttpClient::Response HttpClient::request(const std::string& method, const std::string& path,
                                          const std::string& body,
                                          const std::vector<std::string>& headers) {
-    std::string text = method + " " + path + " HTTP/1.1\r\nHost: 127.0.0.1\r\nConnection: close\r\n";
+    std::string text =
+        method + " " + path + " HTTP/1.1\r\nHost: 127.0.0.1\r\nConnection: close\r\n";
     for (const auto& h : headers) text += h + "\r\n";
     if (!body.empty() || method == "POST")
         text += "Content-Length: " + std::to_string(body.size()) + "\r\n";
     text += "\r\n" + body;
     const int fd = connectAndSend(text);
     std::string raw;
-    bool closed = false;
-    runUntil([&] {
-        char buffer[65536];
-        for (;;) {
-            const ssize_t n = ::recv(fd, buffer, sizeof buffer, 0);
-            if (n > 0) {
-                raw.append(buffer, static_cast<size_t>(n));
-                continue;
-            }
-            if (n == 0 || errno != EAGAIN) closed = true;
-            return closed;
-        }
-    });
+    const bool closed = runUntil([&] { return readAvailable(fd, raw); });
     ::close(fd);
     Response r;
     const auto end = raw.find("\r\n\r\n");
@@ -84,17 +92,7 @@ HttpClient::Stream::~Stream() {
 }
 
 void HttpClient::Stream::drain() {
-    if (!reading_ || closed_) return;
-    char buffer[65536];
-    for (;;) {
-        const ssize_t n = ::recv(fd_, buffer, sizeof buffer, 0);
-        if (n > 0) {
-            received_.append(buffer, static_cast<size_t>(n));
-            continue;
-        }
-        if (n == 0 || errno != EAGAIN) closed_ = true;
-        return;
-    }
+    if (!closed_) closed_ = readAvailable(fd_, received_);
 }
 
 bool HttpClient::Stream::waitFor(const std::string& text, std::chrono::milliseconds limit) {

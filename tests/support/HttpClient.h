@@ -24,8 +24,7 @@ class HttpClient {
 
     // One request on its own connection ("Connection: close"); the answer read to its end.
     Response request(const std::string& method, const std::string& path,
-                     const std::string& body = "",
-                     const std::vector<std::string>& headers = {});
+                     const std::string& body = "", const std::vector<std::string>& headers = {});
 
     // An open GET whose answer keeps coming (an event stream).
     class Stream {
@@ -41,9 +40,6 @@ class HttpClient {
         const std::string& received() const { return received_; }
         // Whether the server closed the connection.
         bool closed() const { return closed_; }
-        // Stops reading for a while without closing (a client that does not keep up).
-        void readNothing() { reading_ = false; }
-        int fd() const { return fd_; }
 
       private:
         void drain();
@@ -52,7 +48,6 @@ class HttpClient {
         int fd_;
         std::string received_;
         bool closed_ = false;
-        bool reading_ = true;
     };
 
     // Runs the loop until done() holds or the time is up; done()'s last answer.

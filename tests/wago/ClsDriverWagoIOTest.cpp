@@ -14,6 +14,7 @@
 #include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
 #include "support/RuntimeFixture.h"
+#include "support/IncidentRecorder.h"
 
 namespace maroset::test {
 namespace {
@@ -367,8 +368,8 @@ TEST_F(WagoYields, AShutdownWhileThePassYieldsEndsThePassAndLeavesNoConnection) 
 using WagoDiagnostics = WagoDriver;
 
 TEST_F(WagoDiagnostics, TheTraceTellsEachFailedCallAndEveryReconnect) {
-    std::vector<std::string> lines;
-    runtime().trace().setSink([&](std::string_view line) { lines.emplace_back(line); });
+    test::IncidentRecorder incidents;
+    const std::vector<std::string>& lines = incidents.lines;
     n = makeNode();
     scan({"IW300"});
     tick();
@@ -379,25 +380,40 @@ TEST_F(WagoDiagnostics, TheTraceTellsEachFailedCallAndEveryReconnect) {
 
     using ::testing::Contains;
     const std::string port = std::to_string(coupler.port());
-    EXPECT_THAT(lines, Contains("Coupler: connected to the coupler at 127.0.0.1:502 (TCP port " +
-                                port + "), exception status 00"));
-    EXPECT_THAT(lines, Contains("Coupler: MBTReadRegisters(3, 300, 1) failed: status 2, Illegal "
-                                "data address"));
-    EXPECT_THAT(lines, Contains("Coupler: reconnecting to the coupler at 127.0.0.1"));
-    EXPECT_THAT(lines, Contains("Coupler: MBTConnect(127.0.0.1, 502) failed: status 261, Could "
-                                "not connect to the coupler (Connection refused)"));
+    // The port named is the one the connection really went to, not 502.
+    EXPECT_THAT(lines, Contains("Coupler: connecting to the coupler at 127.0.0.1:" + port));
+    EXPECT_THAT(lines, Contains("Coupler: connected to the coupler at 127.0.0.1:" + port +
+                                ", exception status 00"));
+    EXPECT_THAT(lines, Contains("Coupler: reading IW300: MBTReadRegisters(3, 300, 1) failed: "
+                                "status 2, Illegal data address"));
+    const auto* failedRead = incidents.find("reading IW300");
+    ASSERT_NE(failedRead, nullptr);
+    EXPECT_EQ(failedRead->tag, "IW300");
+    EXPECT_EQ(failedRead->endpoint, "127.0.0.1:" + port);
+    EXPECT_THAT(lines, Contains("Coupler: reconnecting to the coupler at 127.0.0.1 (last "
+                                "127.0.0.1:" + port + ")"));
+    EXPECT_THAT(lines, Contains("Coupler: disconnected from the coupler at 127.0.0.1:" + port));
+    EXPECT_THAT(lines, Contains("Coupler: cannot connect to the coupler at 127.0.0.1:" + port +
+                                ": status 261, Could not connect to the coupler (Connection "
+                                "refused)"));
     EXPECT_TRUE(host.errors.empty());
 }
 
 TEST_F(WagoDiagnostics, AnErrorThatLeavesAPassIsTracedAndTheNextTickScansAgain) {
-    std::vector<std::string> lines;
-    runtime().trace().setSink([&](std::string_view line) { lines.emplace_back(line); });
+    test::IncidentRecorder incidents;
+    const std::vector<std::string>& lines = incidents.lines;
     n = makeNode();
     scan({"IW0", "IWx"});
     tick();
     tick();
-    ASSERT_EQ(lines.size(), 3u);  // connected, then one line per pass
-    EXPECT_EQ(lines[1], "Coupler: error 13 in Maroset.ClsDriverWagoIO: Type mismatch");
+    // Connecting, connected, the tag flagged when added, then per pass the tag and the error.
+    ASSERT_EQ(lines.size(), 7u) << ::testing::PrintToString(lines);
+    EXPECT_EQ(lines[2], "Coupler: tag IWx: \"x\" is not a tag number: every scan pass stops at "
+                        "it with error 13 (Type mismatch), and the tags after it are not read");
+    EXPECT_EQ(lines[3], "Coupler: tag IWx stops the pass: error 13 (Type mismatch)");
+    EXPECT_EQ(lines[4], "Coupler: error 13 in Maroset.ClsDriverWagoIO: Type mismatch (127.0.0.1:" +
+                            std::to_string(coupler.port()) + ")");
+    EXPECT_EQ(lines[5], lines[3]);
     EXPECT_EQ(coupler.requests(), (std::vector<Request>{{kFc04, 0, 1}, {kFc04, 0, 1}}));
     EXPECT_TRUE(host.changes.empty());
 }
