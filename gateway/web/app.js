@@ -147,6 +147,9 @@ function loadTags(list) {
   const fragment = document.createDocumentFragment();
   for (const tag of list) {
     const key = keyOf(tag.node, tag.handle);
+    // A change the table already holds is not counted a second time.
+    const change = pending.get(key);
+    if (change && tag.time && change.time <= tag.time) pending.delete(key);
     let row = rows.get(key);
     if (row) {
       row.tag.changes = tag.changes;
@@ -199,7 +202,7 @@ function putOut() {
 }
 
 // Keeps the trend samples of a numeric tag in a ring: time in seconds since the page
-// loaded and value, in single precision so ten thousand tags stay a few megabytes. Times
+// loaded and value, in single precision (ten thousand tags take some 24 MB). Times
 // are those of arrival, so a service whose clock differs from the browser's draws right.
 const epoch = Date.now();
 function record(row, value) {
