@@ -38,7 +38,7 @@ void HostOptions::read(const CommandLine& cl) {
     trace = cl.has("trace");
 }
 
-void HostOptions::apply(std::optional<TracePrinter>& trace) const {
+void HostOptions::apply(std::optional<TracePrinter>& printer) const {
     Runtime& rt = Runtime::current();
     if (driveRoot) rt.files().setDriveRoot(*driveRoot);
     for (const auto& m : serialPorts) rt.mapSerialPort(m.port, m.device, m.node);
@@ -47,8 +47,8 @@ void HostOptions::apply(std::optional<TracePrinter>& trace) const {
     if (trace) {
         // Standard error, flushed per line: events and replies on standard output stay as
         // they are, and a user watching a line sees each incident as it happens.
-        trace.emplace(rt.incidents(),
-                      [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
+        printer.emplace(rt.incidents(),
+                        [](std::string_view line) { std::cerr << "trace " << line << std::endl; });
     }
 }
 

@@ -31,8 +31,8 @@ struct HostOptions {
     // Reads them from a parsed command line (UsageError when one is malformed).
     void read(const CommandLine& cl);
     // Sets up the current runtime: drive root, serial ports, Modbus port, trap; with --trace,
-    // starts trace printing the link incidents to standard error, for as long as it lives.
-    void apply(std::optional<TracePrinter>& trace) const;
+    // starts printer writing the link incidents to standard error, for as long as it lives.
+    void apply(std::optional<TracePrinter>& printer) const;
     // The project's file as a native path (a path on drive C: mapped to the drive root).
     std::filesystem::path projectFile() const;
     // Whether the project file is there (a path on drive C: that the load will judge counts).

@@ -11,6 +11,7 @@
 #include "df1/Df1Line.h"
 #include "gateway/EventStream.h"
 #include "sim/df1/Df1Simulator.h"
+#include "sim/intech/IntechSimulator.h"
 #include "sim/softplc/SoftPlcSimulator.h"
 #include "softplc/SoftPlcProject.h"
 
@@ -100,6 +101,47 @@ TEST_F(Df1LinkState, AQuietPlcTakesTheNodeDownAndItsAnswerBringsItBackUp) {
     ASSERT_GE(events.size(), 2u);
     EXPECT_EQ(events[events.size() - 2], "PLC down");
     EXPECT_EQ(events.back(), "PLC up");
+}
+
+// Intech instruments on an in-memory line stop answering and answer again.
+class IntechLinkState : public RuntimeFixture {
+  protected:
+    IntechLinkState() {
+        runtime().serialDevices().plug("/dev/ttyS0", cable.hostEnd());
+        db->AddNode("Meter", "NUVINTECH", "", 100);
+        db->getNode("Meter")->AddTag(1, "01LAI4");
+        db->StartScanning();
+    }
+    ~IntechLinkState() override {
+        db->StopScanning();
+        db->RemoveAllNodes();
+    }
+
+    ClsNodeDBInterface host;
+    std::shared_ptr<nodeDB> db = host.nodeDB();
+    platform::MemorySerialCable cable{loop()};
+    sim::IntechSimulator instruments{loop(), cable.deviceEnd(), "memory cable", {"01"}};
+    LinkWatch watch{runtime()};
+};
+
+TEST_F(IntechLinkState, SilentInstrumentsTakeTheNodeDownAndTheirAnswerBringsItBackUp) {
+    advance(3s);
+    EXPECT_EQ(watch.state("Meter"), "up");
+    const LinkCounters before = watch.status("Meter").counters;
+
+    instruments.setFault(sim::IntechSimulator::Fault::Silence, sim::IntechSimulator::Always);
+    advance(15s);
+    EXPECT_EQ(watch.state("Meter"), "down");
+    EXPECT_GT(watch.status("Meter").counters.timeouts, before.timeouts);
+
+    instruments.setFault(sim::IntechSimulator::Fault::None);
+    advance(15s);
+    EXPECT_EQ(watch.state("Meter"), "up");
+    EXPECT_EQ(watch.status("Meter").counters.reconnects, before.reconnects + 1);
+    const auto events = watch.linkEvents();
+    ASSERT_GE(events.size(), 2u);
+    EXPECT_EQ(events[events.size() - 2], "Meter down");
+    EXPECT_EQ(events.back(), "Meter up");
 }
 
 // A soft-PLC server in memory stops listening, drops its clients and starts again.
