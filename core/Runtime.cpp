@@ -39,7 +39,7 @@ Runtime::Runtime(std::unique_ptr<platform::EventLoop> loop, std::unique_ptr<plat
       tcp_(*loop_) {
     // An OPC node whose server is an endpoint URL reaches that OPC UA server.
     opcServers_.RegisterScheme("opc.tcp", [this](const std::string& url) {
-        return std::make_shared<platform::opcua::UaServerBackend>(*loop_, *clock_, tcp_, trace_,
+        return std::make_shared<platform::opcua::UaServerBackend>(*loop_, *clock_, tcp_, incidents_,
                                                                   url);
     });
 }

@@ -150,7 +150,7 @@ int32_t UaItem::Write(const Variant& value) {
         });
     const auto self = backend_;  // the item may go while the loop runs
     if (!b.waitFor([&done] { return done; }, CallWait)) {
-        b.trace("write to " + itemID_ + ": no answer", status::BadTimeout);
+        b.trace("write to " + itemID_ + ": no answer", status::BadTimeout, IncidentKind::TimedOut);
         return opc::E_FAIL;
     }
     if (IsBad(result)) b.trace("write to " + itemID_ + " refused", result);
@@ -168,17 +168,20 @@ void UaItem::Scan(const OpcScan& scan) {
 }
 
 UaServerBackend::UaServerBackend(EventLoop& loop, const Clock& clock, TcpNetwork& network,
-                                 const LinkTrace& linkTrace, std::string endpointUrl,
+                                 const LinkIncidents& incidents, std::string endpointUrl,
                                  UaClient::Options options)
-    : loop_(loop), clock_(clock), trace_(linkTrace), url_(std::move(endpointUrl)) {
+    : loop_(loop), clock_(clock), incidents_(incidents), url_(std::move(endpointUrl)) {
     options.endpointUrl = url_;
     const std::weak_ptr<bool> alive = alive_;
     UaClient::Handlers h;
     h.stateChanged = [this, alive](UaClient::State s) {
         if (!alive.expired()) onState(s);
     };
+    // The client tells only what ends a connection: a lost session, or one never made.
     h.incident = [this, alive](const std::string& text, uint32_t status) {
-        if (!alive.expired()) trace(text, status);
+        if (!alive.expired()) {
+            trace(text, status, everActive_ ? IncidentKind::Closed : IncidentKind::OpenFailed);
+        }
     };
     h.dataChange = [this](uint32_t sub, uint32_t handle, DataValue& v) {
         dataChange(sub, handle, v);
@@ -197,16 +200,16 @@ UaServerBackend::~UaServerBackend() {
     *alive_ = false;
 }
 
-void UaServerBackend::trace(const std::string& text, uint32_t status) {
-    if (!trace_.enabled()) return;
-    std::string line = url_ + ": " + text;
-    if (status) line += " (" + StatusName(status) + ")";
+void UaServerBackend::trace(const std::string& text, uint32_t status, IncidentKind kind) {
+    if (!incidents_.wanted()) return;
+    if (kind == IncidentKind::Note && IsBad(status)) kind = IncidentKind::Refused;
+    const auto words = [&] { return text + (status ? " (" + StatusName(status) + ")" : ""); };
     // Before any group has an item the node is not known yet: the endpoint stands for it.
     if (nodes_.empty()) {
-        trace_.write(url_, text + (status ? " (" + StatusName(status) + ")" : ""));
+        incidents_.report(url_, kind, url_, words);
         return;
     }
-    for (const auto& node : nodes_) trace_.write(node, line);
+    for (const auto& node : nodes_) incidents_.report(node, kind, url_, words);
 }
 
 void UaServerBackend::wake() {
@@ -353,7 +356,7 @@ void UaServerBackend::badQuality(int32_t quality) {
 void UaServerBackend::onState(UaClient::State s) {
     wake();
     if (s == UaClient::State::Active) {
-        if (everActive_) trace("session is back");
+        trace(everActive_ ? "session is back" : "session active", 0, IncidentKind::Opened);
         everActive_ = true;
         subscriptions_.clear();
         doomed_.clear();

@@ -8,7 +8,7 @@
 
 #include "platform/Clock.h"
 #include "platform/EventLoop.h"
-#include "platform/LinkTrace.h"
+#include "platform/LinkIncidents.h"
 #include "platform/opc/OpcServerBackend.h"
 #include "platform/opcua/UaClient.h"
 #include "platform/tcp/TcpNetwork.h"
@@ -32,7 +32,7 @@ class UaServerBackend final : public OpcServerBackend,
                               public std::enable_shared_from_this<UaServerBackend> {
   public:
     UaServerBackend(EventLoop& loop, const Clock& clock, TcpNetwork& network,
-                    const LinkTrace& linkTrace, std::string endpointUrl,
+                    const LinkIncidents& incidents, std::string endpointUrl,
                     UaClient::Options options = {});
     ~UaServerBackend() override;
 
@@ -62,13 +62,15 @@ class UaServerBackend final : public OpcServerBackend,
     // Runs the loop until done() or the time is up; false when the time ran out.
     bool waitFor(const std::function<bool()>& done, std::chrono::milliseconds limit);
     void wake();
-    // Every incident of this server goes through here: one line per node using it.
-    void trace(const std::string& text, uint32_t status = 0);
+    // Every incident of this server goes through here: one per node using it. A refusal
+    // carries the UA status, whose name is told beside the words.
+    void trace(const std::string& text, uint32_t status = 0,
+               IncidentKind kind = IncidentKind::Note);
     void badQuality(int32_t quality);
 
     EventLoop& loop_;
     const Clock& clock_;
-    const LinkTrace& trace_;
+    const LinkIncidents& incidents_;
     std::string url_;
     std::unique_ptr<UaClient> client_;
     int clients_ = 0;
