@@ -195,8 +195,15 @@ void FrmNUVProSerial::openPort() {
 }
 
 void FrmNUVProSerial::write(std::string_view data) {
-    port_.Output(data);
-    incident(IncidentKind::Sent, [&] { return "sent " + platform::Hex(data); });
+    if (port_.Output(data)) {
+        incident(IncidentKind::Sent, [&] { return "sent " + platform::Hex(data); });
+        return;
+    }
+    // Lost as a frame the PLC never answered: the link's time-out and retries take over.
+    incident(IncidentKind::Dropped, [&] {
+        return "not sent, " + endpoint_ + " takes no output (its queue is full): " +
+               platform::Hex(data);
+    });
 }
 
 bool FrmNUVProSerial::raiseComplete(const std::string& text, uint8_t level, IncidentKind kind) {

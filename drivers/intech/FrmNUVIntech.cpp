@@ -177,7 +177,14 @@ void FrmNUVIntech::SendCommand(const std::string& cmd) {
     proc.run([&] {
         const std::string request = cmd + bcc + "\r";
         if (collector_.dropped() > 0) traceDropped();
-        MSComm1.Output(request);
+        if (!MSComm1.Output(request)) {
+            // Lost as a command the instrument never answered: the next tick goes on.
+            incident(IncidentKind::Dropped, [&] {
+                return "not sent, " + endpoint_ +
+                       " takes no output (its queue is full): " + platform::Printable(request);
+            });
+            return;
+        }
         incident(IncidentKind::Sent, [&] {
             std::string text = "sent " + platform::Printable(request);
             if (cmd.empty()) text += " (an empty poll entry: no tag is read by its place)";

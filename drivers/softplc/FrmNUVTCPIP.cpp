@@ -140,6 +140,11 @@ void FrmNUVTCPIP::Winsock_DataArrival(int32_t) {
     ArrivalSplitter splitter;
     splitter.feed(text);
     splitter.finish();
+    if (splitter.overlong()) {
+        trace(IncidentKind::Dropped, "a piece longer than " +
+                                         std::to_string(ArrivalSplitter::PieceLimit) +
+                                         " bytes with no \"%>\": only its start is judged");
+    }
     std::string piece;
     while (!unloaded_ && !proc.left() && splitter.next(piece)) handlePiece(proc, piece);
 }
