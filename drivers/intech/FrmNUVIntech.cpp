@@ -187,7 +187,8 @@ void FrmNUVIntech::SendCommand(const std::string& cmd) {
         }
         incident(IncidentKind::Sent, [&] {
             std::string text = "sent " + platform::Printable(request);
-            if (cmd.empty()) text += " (an empty poll entry: no tag is read by its place)";
+            // The list keeps an empty place after a tag whose command it already had.
+            if (cmd.empty()) text += " (the poll list's empty entry, sent as the BCC of nothing)";
             return text;
         });
     });
@@ -387,9 +388,9 @@ std::string_view FrmNUVIntech::traceSource() const {
     return NodeName_.empty() ? std::string_view(Caption) : std::string_view(NodeName_);
 }
 
-void FrmNUVIntech::incident(IncidentKind kind,
+void FrmNUVIntech::incident(IncidentKind kind, std::string_view tag,
                             const platform::LinkIncident::TextSource& text) const {
-    Runtime::current().incidents().report(traceSource(), kind, endpoint_, text);
+    Runtime::current().incidents().report(traceSource(), kind, endpoint_, tag, text);
 }
 
 void FrmNUVIntech::traceDropped() {

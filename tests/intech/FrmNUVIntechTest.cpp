@@ -9,6 +9,7 @@
 #include "IntechFrames.h"
 #include "platform/serial/MemorySerialCable.h"
 #include "support/ErrorOf.h"
+#include "drivers/intech/IntechCollector.h"
 #include "support/IncidentRecorder.h"
 #include "support/RuntimeFixture.h"
 
@@ -176,6 +177,50 @@ TEST_F(IntechLine, BusyIsReadOnlyAndPLCWordCountReadsZero) {
     EXPECT_EQ(test::errorOf([&] { frm->Busy(1); }), 382);
     frm->PLCWordCount(2);
     EXPECT_EQ(frm->PLCWordCount(), 0);
+}
+
+// What the trace tells a person about the line, each line checked by its words.
+using IntechLineTrace = IntechLine;
+
+TEST_F(IntechLineTrace, AReplyCutShortByANewAtSignIsToldAndTheNewFrameDecoded) {
+    poll({"@01EX DI:"});
+    advance(100ms);
+    sent();
+    answer("@01EX DI 00" + WithBcc("@01OK:") + "\r");
+    EXPECT_TRUE(traced("Meter: reply cut short by a new \"@\" after 11 characters: @01EX DI 00"));
+    EXPECT_TRUE(traced("Meter: received @01OK:35"));
+    EXPECT_EQ(incidents_.find("cut short")->kind, platform::IncidentKind::Dropped);
+}
+
+TEST_F(IntechLineTrace, AnEndlessReplyIsDroppedWithOneLineAndTheNextReplyDecodes) {
+    poll({"@01EX DI:"});
+    advance(100ms);
+    sent();
+    answer("@01EX E1 " + std::string(3 * IntechCollector::FrameLimit, '7'));
+    EXPECT_EQ(incidents_.count("reply longer than 512 characters: dropped"), 1u);
+    answer(WithBcc("@01EX DI 0003 0015:") + "\r");
+    EXPECT_EQ(names.size(), 1u) << "the reply after the endless one is decoded";
+    EXPECT_TRUE(traced("characters outside a frame")) << "what came after the drop is counted";
+}
+
+TEST_F(IntechLineTrace, EveryIncidentNamesTheDeviceAndTheOpenSaysWhichPort) {
+    poll({"@01EX DI:"});
+    advance(100ms);
+    EXPECT_TRUE(traced("Meter: opened port 1 (/dev/ttyS0, 9600,n,8,1)"));
+    EXPECT_EQ(incidents_.find("sent @01EX DI:")->endpoint, "/dev/ttyS0");
+}
+
+TEST_F(IntechLineTrace, ANodeWithNoTagAndTheEmptyPollEntryAreExplained) {
+    frm->TmrScanRate.Enabled(true);
+    advance(100ms);
+    EXPECT_TRUE(traced("Meter: no poll command: the node has no tag, so each tick fails with "
+                       "error 9 until one is added"));
+    frm->PollCommand(1, "");
+    frm->PollCommand(0, "@01EX DI:");
+    advance(100ms);
+    answer(ok);
+    EXPECT_TRUE(traced("Meter: sent 0<CR> (the poll list's empty entry, sent as the BCC of "
+                       "nothing)"));
 }
 
 }  // namespace

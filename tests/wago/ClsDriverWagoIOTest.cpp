@@ -418,6 +418,32 @@ TEST_F(WagoDiagnostics, AnErrorThatLeavesAPassIsTracedAndTheNextTickScansAgain) 
     EXPECT_TRUE(host.changes.empty());
 }
 
+TEST_F(WagoDiagnostics, AddTagFlagsTagsThatStopEveryPassOrThatNoReadPolls) {
+    test::IncidentRecorder incidents;
+    n = makeNode();
+    scan({"IW0", "OW32700", "XW3"});
+    EXPECT_TRUE(incidents.has("Coupler: tag OW32700: its read-back address 33212 passes 32767: "
+                              "every scan pass stops at it with error 6 (Overflow), and the tags "
+                              "after it are not read"));
+    EXPECT_TRUE(incidents.has("Coupler: tag XW3: no read polls it: \"XW\" is none of IW, OW, "
+                              "ID, OD"));
+    EXPECT_EQ(incidents.find("tag OW32700:")->tag, "OW32700");
+    tick();
+    EXPECT_TRUE(incidents.has("Coupler: tag OW32700 stops the pass: error 6 (Overflow)"));
+}
+
+TEST_F(WagoDiagnostics, AnAddressThatIsNotADottedIpv4AddressIsHinted) {
+    test::IncidentRecorder incidents;
+    n = makeNode(Variant("localhost"));
+    const auto* failed = incidents.find("cannot connect to the coupler at localhost:");
+    ASSERT_NE(failed, nullptr) << ::testing::PrintToString(incidents.lines);
+    EXPECT_NE(failed->text.find("; IPAddress \"localhost\" is not a dotted IPv4 address such as "
+                                "192.168.1.10"),
+              std::string::npos)
+        << failed->text;
+    EXPECT_EQ(failed->kind, platform::IncidentKind::OpenFailed);
+}
+
 TEST_F(WagoDiagnostics, WithTheTrapOnTheScanLogsUnderItsOwnLabel) {
     runtime().trap().setEnabled(true);
     n = makeNode();
