@@ -232,7 +232,8 @@ void FrmNUVIntech::onTick() {
     if (unloaded_) return;
     const std::string source(traceSource());
     const std::string endpoint = endpoint_;
-    RunEventProcedure(source, [&] { TmrScanRate_Timer(); }, endpoint);
+    RunEventProcedure(
+        source, [&] { TmrScanRate_Timer(); }, endpoint);
 }
 
 void FrmNUVIntech::onComm() {
@@ -240,7 +241,8 @@ void FrmNUVIntech::onComm() {
     if (unloaded_) return;
     const std::string source(traceSource());
     const std::string endpoint = endpoint_;
-    RunEventProcedure(source, [&] { MSComm1_OnComm(); }, endpoint);
+    RunEventProcedure(
+        source, [&] { MSComm1_OnComm(); }, endpoint);
 }
 
 void FrmNUVIntech::MSComm1_OnComm() {
@@ -395,9 +397,9 @@ void FrmNUVIntech::incident(IncidentKind kind, std::string_view tag,
 
 void FrmNUVIntech::traceDropped() {
     incident(IncidentKind::Dropped, [&] {
-        std::string text = "dropped " + std::to_string(collector_.dropped()) +
-                           " characters outside a frame: " +
-                           platform::Printable(collector_.droppedSample());
+        std::string text =
+            "dropped " + std::to_string(collector_.dropped()) +
+            " characters outside a frame: " + platform::Printable(collector_.droppedSample());
         if (collector_.dropped() > static_cast<int64_t>(collector_.droppedSample().size()))
             text += "...";
         return text;

@@ -40,8 +40,7 @@ TEST(IntechEndlessFrame, TwentyMegabytesWithoutAColonAreDroppedAndTheNextFrameIs
 
 TEST(IntechEndlessFrame, AFrameUpToTheLimitIsKeptWhole) {
     IntechCollector c;
-    const std::string longest =
-        "@01EX " + std::string(IntechCollector::FrameLimit - 9, '0') + ":";
+    const std::string longest = "@01EX " + std::string(IntechCollector::FrameLimit - 9, '0') + ":";
     const std::string frame = longest + "AB";
     ASSERT_EQ(frame.size(), IntechCollector::FrameLimit);
     EXPECT_EQ(feedAll(c, frame), std::vector<std::string>{frame});

@@ -7,9 +7,9 @@
 #include <vector>
 
 #include "IntechFrames.h"
+#include "drivers/intech/IntechCollector.h"
 #include "platform/serial/MemorySerialCable.h"
 #include "support/ErrorOf.h"
-#include "drivers/intech/IntechCollector.h"
 #include "support/IncidentRecorder.h"
 #include "support/RuntimeFixture.h"
 
@@ -213,14 +213,16 @@ TEST_F(IntechLineTrace, EveryIncidentNamesTheDeviceAndTheOpenSaysWhichPort) {
 TEST_F(IntechLineTrace, ANodeWithNoTagAndTheEmptyPollEntryAreExplained) {
     frm->TmrScanRate.Enabled(true);
     advance(100ms);
-    EXPECT_TRUE(traced("Meter: no poll command: the node has no tag, so each tick fails with "
-                       "error 9 until one is added"));
+    EXPECT_TRUE(
+        traced("Meter: no poll command: the node has no tag, so each tick fails with "
+               "error 9 until one is added"));
     frm->PollCommand(1, "");
     frm->PollCommand(0, "@01EX DI:");
     advance(100ms);
     answer(ok);
-    EXPECT_TRUE(traced("Meter: sent 0<CR> (the poll list's empty entry, sent as the BCC of "
-                       "nothing)"));
+    EXPECT_TRUE(
+        traced("Meter: sent 0<CR> (the poll list's empty entry, sent as the BCC of "
+               "nothing)"));
 }
 
 }  // namespace

@@ -45,7 +45,6 @@ class SoftPlcClient : public test::RuntimeFixture {
         advance(milliseconds(0));
     }
 
-
     // Lets the first tick of the acknowledgement timer pass: it finds the queue empty and
     // stops the timer, so the next send starts its count afresh.
     void settle() {

@@ -15,7 +15,8 @@ TEST(SoftPlcEndlessFrame, TwentyMegabytesWithoutADelimiterAreCutAndTheNextFrameI
     ArrivalSplitter splitter;
     const std::string chunk(test::EndlessFrameChunk, 'x');
     splitter.feed("<%NTV001;~");
-    for (size_t sent = 0; sent < test::EndlessFrameBytes; sent += chunk.size()) splitter.feed(chunk);
+    for (size_t sent = 0; sent < test::EndlessFrameBytes; sent += chunk.size())
+        splitter.feed(chunk);
     EXPECT_TRUE(splitter.overlong());
     EXPECT_LT(test::ResidentBytes(), before + test::EndlessFrameGrowthLimit);
 
