@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "IntechFrames.h"
+#include "core/TracePrinter.h"
 #include "drivers/intech/IntechCollector.h"
 #include "platform/serial/MemorySerialCable.h"
 #include "support/ErrorOf.h"
@@ -208,6 +209,37 @@ TEST_F(IntechLineTrace, EveryIncidentNamesTheDeviceAndTheOpenSaysWhichPort) {
     advance(100ms);
     EXPECT_TRUE(traced("Meter: opened port 1 (/dev/ttyS0, 9600,n,8,1)"));
     EXPECT_EQ(incidents_.find("sent @01EX DI:")->endpoint, "/dev/ttyS0");
+}
+
+TEST_F(IntechLineTrace, APortThatCannotOpenIsPrintedOnceThenSummarisedEveryTenSeconds) {
+    std::vector<std::string> printed;
+    TracePrinter printer(runtime().incidents(),
+                         [&](std::string_view line) { printed.emplace_back(line); });
+    runtime().mapSerialPort(1, "/nonexistent/intech", "meter");
+    poll({"@01EX DI:"});
+    advance(10'100ms);
+    const std::string open =
+        "Meter: 09:00:00.100 cannot open port 1: Cannot open serial device "
+        "/nonexistent/intech";
+    ASSERT_EQ(printed.size(), 4u) << ::testing::PrintToString(printed);
+    EXPECT_EQ(printed[0].rfind(open, 0), 0u) << printed[0];
+    EXPECT_EQ(printed[1].rfind("Meter: 09:00:00.100 error 8002 in Maroset.FrmNUVIntech: ", 0), 0u)
+        << printed[1];
+    EXPECT_TRUE(printed[2].starts_with("Meter: 09:00:10.100 cannot open port 1: ")) << printed[2];
+    EXPECT_TRUE(printed[2].ends_with(" ... repeated 100 times")) << printed[2];
+    EXPECT_TRUE(printed[3].ends_with(" ... repeated 100 times")) << printed[3];
+
+    // One more failing tick, then plugged in: the run ends with what was left unsaid, and the
+    // line opens.
+    advance(100ms);
+    EXPECT_EQ(printed.size(), 4u);
+    runtime().serialDevices().plug("/nonexistent/intech", cable.hostEnd());
+    printed.clear();
+    advance(100ms);
+    ASSERT_GE(printed.size(), 3u) << ::testing::PrintToString(printed);
+    EXPECT_TRUE(printed[0].starts_with("Meter: 09:00:10.300 cannot open port 1: ")) << printed[0];
+    EXPECT_TRUE(printed[0].ends_with(" ... repeated 1 times")) << printed[0];
+    EXPECT_EQ(printed[2], "Meter: 09:00:10.300 opened port 1 (/nonexistent/intech, 9600,n,8,1)");
 }
 
 TEST_F(IntechLineTrace, ANodeWithNoTagAndTheEmptyPollEntryAreExplained) {
