@@ -110,7 +110,10 @@ class NullDevice final : public platform::SerialDevice {
   public:
     void listen(Handlers) override {}
     void stopListening() override {}
-    void write(std::string_view bytes) override { benchmark::DoNotOptimize(bytes.data()); }
+    bool write(std::string_view bytes) override {
+        benchmark::DoNotOptimize(bytes.data());
+        return true;
+    }
     std::string name() const override { return "null"; }
 };
 

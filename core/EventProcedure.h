@@ -12,8 +12,7 @@ namespace maroset {
 // called it. It is told as an error incident of `source` (the node's name) at `endpoint` (the
 // device or address of its link, when known) and dropped, so a dead device or a bad frame
 // never stops the host; the driver's next tick tries again.
-void ReportUnhandled(std::string_view source, const VbError& error,
-                     std::string_view endpoint = {});
+void ReportUnhandled(std::string_view source, const VbError& error, std::string_view endpoint = {});
 
 template <class Body>
 void RunEventProcedure(std::string_view source, Body&& body, std::string_view endpoint = {}) {

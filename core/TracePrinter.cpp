@@ -15,8 +15,10 @@ bool recurs(IncidentKind kind) {
         case IncidentKind::OpenFailed:
         case IncidentKind::Refused:
         case IncidentKind::Error:
-        case IncidentKind::Note: return true;
-        default: return false;
+        case IncidentKind::Note:
+            return true;
+        default:
+            return false;
     }
 }
 
@@ -35,8 +37,7 @@ std::string TracePrinter::TimeOfDay(platform::DateTime t) {
     const std::chrono::hh_mm_ss<std::chrono::milliseconds> hms(t - day);
     char out[16];
     std::snprintf(out, sizeof out, "%02d:%02d:%02d.%03d", static_cast<int>(hms.hours().count()),
-                  static_cast<int>(hms.minutes().count()),
-                  static_cast<int>(hms.seconds().count()),
+                  static_cast<int>(hms.minutes().count()), static_cast<int>(hms.seconds().count()),
                   static_cast<int>(hms.subseconds().count()));
     return out;
 }
@@ -70,8 +71,8 @@ void TracePrinter::print(std::string_view node, platform::DateTime when, std::st
     sink_(line);
 }
 
-void TracePrinter::summarise(std::string_view node, platform::DateTime when,
-                             std::string_view text, Run& run) {
+void TracePrinter::summarise(std::string_view node, platform::DateTime when, std::string_view text,
+                             Run& run) {
     print(node, when,
           std::string(text) + " ... repeated " + std::to_string(run.repeats) + " times");
     run.repeats = 0;

@@ -43,8 +43,7 @@ class TracePrinter {
 
     void read(const platform::LinkIncident& incident);
     void print(std::string_view node, platform::DateTime when, std::string_view text);
-    void summarise(std::string_view node, platform::DateTime when, std::string_view text,
-                   Run& run);
+    void summarise(std::string_view node, platform::DateTime when, std::string_view text, Run& run);
     void endRuns(std::string_view node, platform::DateTime when);
 
     Sink sink_;

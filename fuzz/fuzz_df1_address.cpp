@@ -23,7 +23,7 @@ class NullDevice final : public platform::SerialDevice {
   public:
     void listen(Handlers) override {}
     void stopListening() override {}
-    void write(std::string_view) override {}
+    bool write(std::string_view) override { return true; }
     std::string name() const override { return "null"; }
 };
 

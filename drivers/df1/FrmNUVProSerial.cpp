@@ -48,10 +48,9 @@ FrmNUVProSerial::FrmNUVProSerial(std::string nodeName)
     TmrWatchDog.Enabled(true);  // from creation on, never stopped
 
     onComm_ = port_.OnComm.subscribe([this] { fromLoop([this] { MSComm1_OnComm(); }); });
-    broken_ = port_.Broken.subscribe(
-        [this](const std::string& why) {
-            incident(IncidentKind::Closed, [&] { return "line broken: " + why; });
-        });
+    broken_ = port_.Broken.subscribe([this](const std::string& why) {
+        incident(IncidentKind::Closed, [&] { return "line broken: " + why; });
+    });
     scanTick_ = TmrScanRate.Tick.subscribe([this] { fromLoop([this] { TmrScanRate_Timer(); }); });
     timeOutTick_ =
         TmrCommsTimeOut.Tick.subscribe([this] { fromLoop([this] { TmrCommsTimeOut_Timer(); }); });
@@ -195,8 +194,15 @@ void FrmNUVProSerial::openPort() {
 }
 
 void FrmNUVProSerial::write(std::string_view data) {
-    port_.Output(data);
-    incident(IncidentKind::Sent, [&] { return "sent " + platform::Hex(data); });
+    if (port_.Output(data)) {
+        incident(IncidentKind::Sent, [&] { return "sent " + platform::Hex(data); });
+        return;
+    }
+    // Lost as a frame the PLC never answered: the link's time-out and retries take over.
+    incident(IncidentKind::Dropped, [&] {
+        return "not sent, " + endpoint_ +
+               " takes no output (its queue is full): " + platform::Hex(data);
+    });
 }
 
 bool FrmNUVProSerial::raiseComplete(const std::string& text, uint8_t level, IncidentKind kind) {
@@ -237,10 +243,14 @@ void FrmNUVProSerial::Transmiter(int16_t code) {
             proc.run([&] { ++nakRetries_; });
             if (nakRetries_ < 4) {
                 proc.run([&] { SendMessage(); });
-                proc.run([&] { raiseComplete("Receivied NAK - Resending Message", 4, IncidentKind::Retried); });
+                proc.run([&] {
+                    raiseComplete("Receivied NAK - Resending Message", 4, IncidentKind::Retried);
+                });
             } else {
                 proc.run([&] { busy_ = false; });
-                proc.run([&] { raiseComplete("Receivied NAK - Aborting message", 4, IncidentKind::Dropped); });
+                proc.run([&] {
+                    raiseComplete("Receivied NAK - Aborting message", 4, IncidentKind::Dropped);
+                });
                 if (life.expired()) return;
                 proc.run([&] { awaitingReply_ = false; });
                 proc.run([&] { nakRetries_ = 0; });
@@ -251,10 +261,13 @@ void FrmNUVProSerial::Transmiter(int16_t code) {
             if (noReplyRetries_ < 4) {
                 // Only an inquiry: the frame is not sent again, and the time-out keeps running.
                 proc.run([&] { write(bytes({DLE, ENQ})); });
-                proc.run([&] { raiseComplete("No Responce - Resending Message", 4, IncidentKind::Retried); });
+                proc.run([&] {
+                    raiseComplete("No Responce - Resending Message", 4, IncidentKind::Retried);
+                });
             } else {
                 proc.run([&] { busy_ = false; });
-                proc.run([&] { raiseComplete("No Responce - Timed out", 4, IncidentKind::TimedOut); });
+                proc.run(
+                    [&] { raiseComplete("No Responce - Timed out", 4, IncidentKind::TimedOut); });
                 if (life.expired()) return;
                 proc.run([&] { noReplyRetries_ = 0; });
                 proc.run([&] { awaitingReply_ = false; });
@@ -356,7 +369,9 @@ void FrmNUVProSerial::Receiver(int16_t code) {
                     statusText_ += std::to_string(rx_.RxBuffer(i)) + "x";
             });
             const std::weak_ptr<int> life = life_;
-            proc.run([&] { raiseComplete("Received Bad CRC " + statusText_, 3, IncidentKind::BadCheck); });
+            proc.run([&] {
+                raiseComplete("Received Bad CRC " + statusText_, 3, IncidentKind::BadCheck);
+            });
             if (life.expired()) return;
             proc.run([&] { lastReply_ = NAK; });
             return;
@@ -367,8 +382,10 @@ void FrmNUVProSerial::Receiver(int16_t code) {
         decodeReply(proc);
     } else if (code == ENQ) {
         proc.run([&] { write(bytes({DLE, lastReply_})); });
-        proc.run([&] { raiseComplete("Received ENQ Responce: " + std::to_string(lastReply_), 3,
-                                     IncidentKind::Note); });
+        proc.run([&] {
+            raiseComplete("Received ENQ Responce: " + std::to_string(lastReply_), 3,
+                          IncidentKind::Note);
+        });
     } else {
         proc.run([&] { lastReply_ = NAK; });
     }
@@ -408,7 +425,8 @@ void FrmNUVProSerial::TmrCommsTimeOut_Timer() {
 
 void FrmNUVProSerial::TmrEndOfMessage_Timer() {
     Procedure proc(kModule, "TmrEndOfMessage_Timer");
-    if (rx_.InMessage) tellReceived(IncidentKind::Dropped, "dropped a partial frame (gap over 15 ms): ");
+    if (rx_.InMessage)
+        tellReceived(IncidentKind::Dropped, "dropped a partial frame (gap over 15 ms): ");
     proc.run([&] { rx_.InMessage = false; });
     proc.run([&] { TmrEndOfMessage.Enabled(false); });
 }

@@ -108,6 +108,13 @@ bool ClsDriverIntech::AddItem(const std::string& TagName, int16_t ClientHandle) 
     Procedure proc(kModule, "AddItem");
     std::string command;
     proc.run([&] { command = IntechTagName::ReadCommand(TagName); });
+    if (command.empty()) {
+        owner().incident(platform::IncidentKind::Note, TagName, [&] {
+            return "tag " + TagName +
+                   ": no poll command reads it (LAI 1-16, EAI 1-64, LDI, LDO after a two-character "
+                   "station address), so it never gets a value";
+        });
+    }
     proc.run([&] {
         TagCount_ = CInt(Variant(static_cast<int32_t>(TagCount_) + 1));
         TagNames_.ReDimPreserve(TagCount_ + 1);

@@ -177,10 +177,18 @@ void FrmNUVIntech::SendCommand(const std::string& cmd) {
     proc.run([&] {
         const std::string request = cmd + bcc + "\r";
         if (collector_.dropped() > 0) traceDropped();
-        MSComm1.Output(request);
+        if (!MSComm1.Output(request)) {
+            // Lost as a command the instrument never answered: the next tick goes on.
+            incident(IncidentKind::Dropped, [&] {
+                return "not sent, " + endpoint_ +
+                       " takes no output (its queue is full): " + platform::Printable(request);
+            });
+            return;
+        }
         incident(IncidentKind::Sent, [&] {
             std::string text = "sent " + platform::Printable(request);
-            if (cmd.empty()) text += " (an empty poll entry: no tag is read by its place)";
+            // The list keeps an empty place after a tag whose command it already had.
+            if (cmd.empty()) text += " (the poll list's empty entry, sent as the BCC of nothing)";
             return text;
         });
     });
@@ -224,7 +232,8 @@ void FrmNUVIntech::onTick() {
     if (unloaded_) return;
     const std::string source(traceSource());
     const std::string endpoint = endpoint_;
-    RunEventProcedure(source, [&] { TmrScanRate_Timer(); }, endpoint);
+    RunEventProcedure(
+        source, [&] { TmrScanRate_Timer(); }, endpoint);
 }
 
 void FrmNUVIntech::onComm() {
@@ -232,7 +241,8 @@ void FrmNUVIntech::onComm() {
     if (unloaded_) return;
     const std::string source(traceSource());
     const std::string endpoint = endpoint_;
-    RunEventProcedure(source, [&] { MSComm1_OnComm(); }, endpoint);
+    RunEventProcedure(
+        source, [&] { MSComm1_OnComm(); }, endpoint);
 }
 
 void FrmNUVIntech::MSComm1_OnComm() {
@@ -380,16 +390,16 @@ std::string_view FrmNUVIntech::traceSource() const {
     return NodeName_.empty() ? std::string_view(Caption) : std::string_view(NodeName_);
 }
 
-void FrmNUVIntech::incident(IncidentKind kind,
+void FrmNUVIntech::incident(IncidentKind kind, std::string_view tag,
                             const platform::LinkIncident::TextSource& text) const {
-    Runtime::current().incidents().report(traceSource(), kind, endpoint_, text);
+    Runtime::current().incidents().report(traceSource(), kind, endpoint_, tag, text);
 }
 
 void FrmNUVIntech::traceDropped() {
     incident(IncidentKind::Dropped, [&] {
-        std::string text = "dropped " + std::to_string(collector_.dropped()) +
-                           " characters outside a frame: " +
-                           platform::Printable(collector_.droppedSample());
+        std::string text =
+            "dropped " + std::to_string(collector_.dropped()) +
+            " characters outside a frame: " + platform::Printable(collector_.droppedSample());
         if (collector_.dropped() > static_cast<int64_t>(collector_.droppedSample().size()))
             text += "...";
         return text;

@@ -112,6 +112,10 @@ class FrmNUVIntech : public std::enable_shared_from_this<FrmNUVIntech> {
     // Closes the port and stops the timers; a reply being handled sends nothing more.
     void Unload();
 
+    // Tells an incident of this line, about `tag` when there is one.
+    void incident(platform::IncidentKind kind, std::string_view tag,
+                  const platform::LinkIncident::TextSource& text) const;
+
     // Decoded values of one reply: tag names and values, zero-based, of equal length.
     Event<VbArray<Variant>&, VbArray<Variant>&> ReadComplete;
     // Declared for the owner's handler; never raised.
@@ -142,7 +146,9 @@ class FrmNUVIntech : public std::enable_shared_from_this<FrmNUVIntech> {
     // The node's name, or the caption before it has one.
     std::string_view traceSource() const;
     void incident(platform::IncidentKind kind,
-                  const platform::LinkIncident::TextSource& text) const;
+                  const platform::LinkIncident::TextSource& text) const {
+        incident(kind, {}, text);
+    }
     void traceDropped();
 
     std::string NodeName_;

@@ -251,11 +251,15 @@ bool ClsDriverOPC::AddItem(const std::string& TagName, int16_t ClientHandle) {
         proc.run([&] {
             int32_t code = errors(1);
             const std::string text = GetErrorString(code);
-            trace(IncidentKind::Refused, [&] {
-                return "AddItem " + itemIDs(1) + " (handle " + std::to_string(ClientHandle) +
-                       "): " + platform::opc::HexCode(code) + " " + text;
-            }, itemIDs(1));
-            ReportError(*this, kDriver, "ClsDriverOPC.AddItem", "TagName: " + TagName + " Error: " + text);
+            trace(
+                IncidentKind::Refused,
+                [&] {
+                    return "AddItem " + itemIDs(1) + " (handle " + std::to_string(ClientHandle) +
+                           "): " + platform::opc::HexCode(code) + " " + text;
+                },
+                itemIDs(1));
+            ReportError(*this, kDriver, "ClsDriverOPC.AddItem",
+                        "TagName: " + TagName + " Error: " + text);
         });
     } else {
         // A handle of 0 or below has no slot: this fails, and the item stays in the group.
@@ -292,10 +296,13 @@ bool ClsDriverOPC::AddItems(int16_t NumItems, VbArray<std::string>& TagNames,
                 // message names no tag.
                 int32_t first = errors(1);
                 const std::string text = GetErrorString(first);
-                trace(IncidentKind::Refused, [&] {
-                    return "AddItems " + itemIDs(i) + " (handle " +
-                           std::to_string(ClientHandles(i)) + "): " + errorWords(errors(i));
-                }, itemIDs(i));
+                trace(
+                    IncidentKind::Refused,
+                    [&] {
+                        return "AddItems " + itemIDs(i) + " (handle " +
+                               std::to_string(ClientHandles(i)) + "): " + errorWords(errors(i));
+                    },
+                    itemIDs(i));
                 ReportError(*this, kDriver, "ClsDriverOPC.AddItems", " Error: " + text);
             });
         } else {
@@ -367,7 +374,8 @@ void ClsDriverOPC::MyOPCGroup_DataChange(int32_t, int32_t NumItems, VbArray<int3
         });
         return;
     }
-    trace(IncidentKind::Received, [&] { return "DataChange " + std::to_string(NumItems) + " items"; });
+    trace(IncidentKind::Received,
+          [&] { return "DataChange " + std::to_string(NumItems) + " items"; });
     // Qualities and time stamps stay here. Nothing of this driver is touched after the
     // report: a host may drop the node while it handles it.
     proc.run([&] { NewValue(*this, ClientHandles, NumItems, ItemValues); });
@@ -387,7 +395,8 @@ void ClsDriverOPC::MyOPCGroup_AsyncReadComplete(int32_t, int32_t NumItems,
         });
         return;
     }
-    trace(IncidentKind::Received, [&] { return "AsyncReadComplete " + std::to_string(NumItems) + " items"; });
+    trace(IncidentKind::Received,
+          [&] { return "AsyncReadComplete " + std::to_string(NumItems) + " items"; });
     // Per-item errors are not looked at, and a failing report is ignored.
     Procedure report(kModule, "MyOPCGroup_AsyncReadComplete", Procedure::Trap::ResumeNext);
     report.run([&] { NewValue(*this, ClientHandles, NumItems, ItemValues); });

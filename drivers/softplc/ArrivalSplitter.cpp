@@ -10,12 +10,21 @@ void ArrivalSplitter::feed(char byte) {
             current_.clear();
             return;
         }
-        current_ += '%';
+        keep("%");
     }
     if (byte == '%')
         percent_ = true;
     else
-        current_ += byte;
+        keep(std::string_view(&byte, 1));
+}
+
+void ArrivalSplitter::keep(std::string_view bytes) {
+    const size_t room = PieceLimit - current_.size();
+    if (bytes.size() > room) {
+        overlong_ = true;
+        bytes = bytes.substr(0, room);
+    }
+    current_.append(bytes);
 }
 
 void ArrivalSplitter::feed(std::string_view chunk) {
@@ -29,14 +38,14 @@ void ArrivalSplitter::feed(std::string_view chunk) {
         if (at == std::string_view::npos) {
             // A trailing '%' may still start a delimiter with the next chunk.
             if (chunk.back() == '%') {
-                current_.append(chunk.substr(0, chunk.size() - 1));
+                keep(chunk.substr(0, chunk.size() - 1));
                 percent_ = true;
             } else {
-                current_.append(chunk);
+                keep(chunk);
             }
             return;
         }
-        current_.append(chunk.substr(0, at));
+        keep(chunk.substr(0, at));
         pieces_.push_back(std::move(current_));
         current_.clear();
         chunk.remove_prefix(at + 2);
@@ -44,7 +53,7 @@ void ArrivalSplitter::feed(std::string_view chunk) {
 }
 
 void ArrivalSplitter::finish() {
-    if (percent_) current_ += '%';
+    if (percent_) keep("%");
     percent_ = false;
     pieces_.push_back(std::move(current_));
     current_.clear();

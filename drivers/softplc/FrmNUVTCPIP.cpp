@@ -73,9 +73,8 @@ std::string FrmNUVTCPIP::endpoint() const {
 
 void FrmNUVTCPIP::trace(IncidentKind kind, std::string_view words, std::string_view frame) const {
     const std::string where = endpoint();
-    Runtime::current().incidents().report(nodeName_, kind, where, [&] {
-        return std::string(words) + platform::Printable(frame);
-    });
+    Runtime::current().incidents().report(
+        nodeName_, kind, where, [&] { return std::string(words) + platform::Printable(frame); });
 }
 
 void FrmNUVTCPIP::SendData(const std::string& MsgType, const Variant& data) {
@@ -140,6 +139,11 @@ void FrmNUVTCPIP::Winsock_DataArrival(int32_t) {
     ArrivalSplitter splitter;
     splitter.feed(text);
     splitter.finish();
+    if (splitter.overlong()) {
+        trace(IncidentKind::Dropped, "a piece longer than " +
+                                         std::to_string(ArrivalSplitter::PieceLimit) +
+                                         " bytes with no \"%>\": only its start is judged");
+    }
     std::string piece;
     while (!unloaded_ && !proc.left() && splitter.next(piece)) handlePiece(proc, piece);
 }
@@ -230,8 +234,8 @@ void FrmNUVTCPIP::TmrAckDelay_Timer() {
                 Winsock.SendData(entry->Message);
             } else {
                 // Not for want of a reply: there is no connection to resend it on.
-                trace(IncidentKind::Dropped,
-                      "frame dropped, not connected to " + endpoint() + ": ", entry->Message);
+                trace(IncidentKind::Dropped, "frame dropped, not connected to " + endpoint() + ": ",
+                      entry->Message);
                 TXQueue.Remove(keyOf(entry->MSGNum));
             }
         });

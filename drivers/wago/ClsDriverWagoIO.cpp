@@ -162,8 +162,8 @@ void ClsDriverWagoIO::connect_to_coupler() {
         connectResult = mbt_.MBTConnect(address, CouplerPort, 0, RequestTimeout, handle_);
         if (connectResult != 0) {
             incident(IncidentKind::OpenFailed, {}, [&] {
-                std::string text = "cannot connect to the coupler at " + endpoint_ +
-                                   ": status " + std::to_string(connectResult) + ", " +
+                std::string text = "cannot connect to the coupler at " + endpoint_ + ": status " +
+                                   std::to_string(connectResult) + ", " +
                                    platform::mbt::StatusText(connectResult);
                 const std::string& cause = mbt_.LastErrorText();
                 if (!cause.empty() && cause != platform::mbt::StatusText(connectResult))
@@ -216,8 +216,8 @@ void ClsDriverWagoIO::WagoIOError() {
     Procedure proc(kModule, "WagoIOError");
     proc.run([&] {
         incident(IncidentKind::Note, {}, [&] {
-            return "reconnecting to the coupler at " + CStr(IPAddress()) + " (last " +
-                   endpoint_ + ")";
+            return "reconnecting to the coupler at " + CStr(IPAddress()) + " (last " + endpoint_ +
+                   ")";
         });
     });
     proc.run([&] { disconnect_from_coupler(); });
@@ -317,9 +317,9 @@ int32_t ClsDriverWagoIO::WriteItem(int32_t ClientHandle, const Variant& data) {
                                                           1, buffer, nullptr, 0);
                 status_ = Variant(result);
                 if (result != 0)
-                    traceFailure("writing " + name + ": MBTWriteCoils(" +
-                                     std::to_string(address) + ", 1)",
-                                 result, IncidentKind::Refused, name);
+                    traceFailure(
+                        "writing " + name + ": MBTWriteCoils(" + std::to_string(address) + ", 1)",
+                        result, IncidentKind::Refused, name);
             });
         }
     }
@@ -372,7 +372,8 @@ bool ClsDriverWagoIO::AddItem(const std::string& TagName, int16_t ClientHandle) 
             }
         } else {
             incident(IncidentKind::Note, name, [&] {
-                return "tag \"" + name + "\": no read polls it (a name of two letters and a number)";
+                return "tag \"" + name +
+                       "\": no read polls it (a name of two letters and a number)";
             });
         }
         if (p.known) {
@@ -403,7 +404,8 @@ void ClsDriverWagoIO::FrmWagoTCP_PollTime() {
     // the next tick tries again. The source is copied: the pass may destroy the driver.
     const std::string source = traceSource();
     const std::string endpoint = endpoint_;
-    RunEventProcedure(source, [this] { scan(); }, endpoint);
+    RunEventProcedure(
+        source, [this] { scan(); }, endpoint);
 }
 
 int16_t ClsDriverWagoIO::readTag(const std::string& prefix, int16_t address, bool& matched) {
@@ -437,8 +439,7 @@ int16_t ClsDriverWagoIO::readTag(const std::string& prefix, int16_t address, boo
     status_ = Variant(result);
     if (result != 0) {
         const std::string tag = prefix + std::to_string(address);
-        traceFailure("reading " + tag + ": " +
-                         (registers ? "MBTReadRegisters(" : "MBTReadCoils(") +
+        traceFailure("reading " + tag + ": " + (registers ? "MBTReadRegisters(" : "MBTReadCoils(") +
                          std::to_string(table) + ", " + std::to_string(wire) + ", 1)",
                      result, IncidentKind::Refused, tag);
     }

@@ -25,7 +25,7 @@ class MemorySerialCable::End final : public SerialDevice, public std::enable_sha
     }
     void stopListening() override { listening_ = false; }
 
-    void write(std::string_view bytes) override {
+    bool write(std::string_view bytes) override {
         const auto line = line_.lock();
         if (!line || line->cut)
             throw VbError(err::CommDeviceNotOpen, "Serial device " + name() + " is gone");
@@ -34,6 +34,7 @@ class MemorySerialCable::End final : public SerialDevice, public std::enable_sha
         line->loop.post([peer, data = std::string(bytes)] {
             if (auto end = peer.lock()) end->deliver(data);
         });
+        return true;
     }
 
     std::string name() const override {

@@ -12,6 +12,9 @@ namespace maroset::platform {
 //
 // Handlers run on the runtime's loop, never inside write(). A handler may stop listening or
 // destroy the device. After `broken` the device delivers nothing more and writes fail.
+//
+// write() never waits: what the device does not take at once waits in a bounded output queue
+// that the loop drains as the device takes it.
 class SerialDevice {
   public:
     struct Handlers {
@@ -27,8 +30,11 @@ class SerialDevice {
     virtual void listen(Handlers handlers) = 0;
     // Stops delivering; bytes that arrive meanwhile are dropped.
     virtual void stopListening() = 0;
-    // Writes every byte, or fails with a run-time error whose description names the device.
-    virtual void write(std::string_view bytes) = 0;
+    // Writes every byte or queues what the device does not take yet, and answers true; answers
+    // false, writing nothing, when the queue has no room for them (a device that stopped
+    // reading). Fails with a run-time error whose description names the device when the line
+    // is broken.
+    virtual bool write(std::string_view bytes) = 0;
     // The device, for messages ("/dev/ttyUSB0").
     virtual std::string name() const = 0;
 };

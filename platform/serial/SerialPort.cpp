@@ -52,10 +52,10 @@ std::string SerialPort::Input() {
     return out;
 }
 
-void SerialPort::Output(std::string_view bytes) {
+bool SerialPort::Output(std::string_view bytes) {
     if (!device_) throw VbError(err::CommPortNotOpen, "Operation valid only when the port is open");
     try {
-        device_->write(bytes);
+        return device_->write(bytes);
     } catch (const VbError&) {
         // The line is gone: the next open reaches the device anew.
         PortOpen(false);

@@ -25,8 +25,11 @@ namespace maroset::platform {
 // - While RThreshold > 0, OnComm is raised once for every byte that arrives, after the byte
 //   is in the input buffer. Input() takes up to InputLen bytes from the buffer (all of them
 //   when InputLen is 0).
-// - Output() writes bytes; on a closed port it fails with 8018; when the line broke it fails
-//   with 8012 and the port is closed.
+// - Output() writes bytes without waiting: what the device does not take at once is queued
+//   (bounded) and goes out as the device takes it, the port staying open. It answers false,
+//   sending nothing, when the device stopped taking output and its queue is full; the owner
+//   treats that as a request that got no reply. On a closed port it fails with 8018; when the
+//   line broke it fails with 8012 and the port is closed.
 // - When the device goes away (adapter unplugged), the port closes itself and raises Broken
 //   with the reason. Opening it again later reaches the device anew.
 //
@@ -52,7 +55,7 @@ class SerialPort {
     void InputLen(int16_t bytes) { inputLen_ = bytes; }
     int32_t InBufferCount() const { return static_cast<int32_t>(input_.size()); }
     std::string Input();
-    void Output(std::string_view bytes);
+    bool Output(std::string_view bytes);
 
     // The device of the current port number.
     std::string DeviceName() const { return devicePath_(commPort_); }

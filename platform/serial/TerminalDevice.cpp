@@ -1,7 +1,6 @@
 #include "platform/serial/TerminalDevice.h"
 
 #include <fcntl.h>
-#include <poll.h>
 #include <sys/file.h>
 #include <termios.h>
 #include <unistd.h>
@@ -152,6 +151,7 @@ TerminalDevice::TerminalDevice(EventLoop& loop, int fd, std::string name)
 TerminalDevice::~TerminalDevice() {
     *alive_ = false;
     stopListening();
+    if (outputWatch_) loop_.unwatch(*outputWatch_);
     ::close(fd_);
 }
 
@@ -194,28 +194,52 @@ void TerminalDevice::breakLine(const std::string& why) {
     if (const auto broken = handlers_.broken) broken(why);
 }
 
-void TerminalDevice::write(std::string_view bytes) {
+bool TerminalDevice::write(std::string_view bytes) {
     if (broken_) throw VbError(err::CommDeviceNotOpen, "Serial device " + name_ + " is gone");
-    const char* p = bytes.data();
-    size_t left = bytes.size();
-    while (left > 0) {
-        const ssize_t n = ::write(fd_, p, left);
+    if (output_.empty()) {
+        bytes.remove_prefix(writeSome(bytes));
+        if (bytes.empty()) return true;
+    } else if (output_.size() + bytes.size() > OutputLimit) {
+        return false;
+    }
+    output_.append(bytes);
+    if (!outputWatch_) {
+        outputWatch_ = loop_.watch(fd_, EventLoop::Writable, [this](short) { drain(); });
+    }
+    return true;
+}
+
+size_t TerminalDevice::writeSome(std::string_view bytes) {
+    size_t done = 0;
+    while (done < bytes.size()) {
+        const ssize_t n = ::write(fd_, bytes.data() + done, bytes.size() - done);
         if (n >= 0) {
-            p += n;
-            left -= static_cast<size_t>(n);
+            done += static_cast<size_t>(n);
             continue;
         }
         if (errno == EINTR) continue;
-        if (errno == EAGAIN || errno == EWOULDBLOCK) {
-            // The output buffer is full: wait for the line to drain, but not forever.
-            pollfd out{fd_, POLLOUT, 0};
-            if (::poll(&out, 1, 1000) > 0) continue;
-            throw VbError(err::CommDeviceNotOpen,
-                          "Serial device " + name_ + " does not take output");
-        }
+        if (errno == EAGAIN || errno == EWOULDBLOCK) break;
         const std::string why = std::strerror(errno);
         throw VbError(err::CommDeviceNotOpen,
                       "Cannot write to serial device " + name_ + ": " + why);
+    }
+    return done;
+}
+
+void TerminalDevice::drain() {
+    try {
+        output_.erase(0, writeSome(output_));
+    } catch (const VbError& e) {
+        // Told as the line breaking; the owner's next write fails and reopens the port.
+        output_.clear();
+        loop_.unwatch(*outputWatch_);
+        outputWatch_.reset();
+        breakLine(e.description());
+        return;
+    }
+    if (output_.empty()) {
+        loop_.unwatch(*outputWatch_);
+        outputWatch_.reset();
     }
 }
 

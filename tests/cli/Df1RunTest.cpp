@@ -69,9 +69,9 @@ TEST(Df1Run, ANodeOnTheMappedPortReportsThePlcsWordsAndWritesBack) {
         "{\"reply\":\"quit\",\"ok\":true}"};
     EXPECT_EQ(r.lines, expected) << r.errors;
     // The trace shows the read of N7:3 on the line, and nothing of it reaches standard output.
-    EXPECT_TRUE(std::regex_search(r.errors,
-                                  std::regex("trace Line1: [0-9]{2}:[0-9]{2}:[0-9]{2}\\.[0-9]{3} "
-                                             "sent 10 02 01 00 0F 00 01 00 A2 02 07 89 03 00 10 03")))
+    EXPECT_TRUE(std::regex_search(
+        r.errors, std::regex("trace Line1: [0-9]{2}:[0-9]{2}:[0-9]{2}\\.[0-9]{3} "
+                             "sent 10 02 01 00 0F 00 01 00 A2 02 07 89 03 00 10 03")))
         << r.errors;
 }
 

@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
-#include "support/RuntimeFixture.h"
 #include "support/IncidentRecorder.h"
+#include "support/RuntimeFixture.h"
 
 namespace maroset {
 namespace {

@@ -35,21 +35,22 @@ TEST_F(TracePrinting, EachLineCarriesTheNodeThenTheLocalTimeToTheMillisecond) {
 
 TEST_F(TracePrinting, AnErrorOfEveryTickIsPrintedOnceThenSummarisedEveryTenSeconds) {
     for (int tick = 0; tick < 25; ++tick) {
-        tell("Meter", IncidentKind::Error, "error 9 in Maroset.FrmNUVIntech: Subscript out of range");
+        tell("Meter", IncidentKind::Error,
+             "error 9 in Maroset.FrmNUVIntech: Subscript out of range");
         advance(1s);
     }
     const std::string text = "error 9 in Maroset.FrmNUVIntech: Subscript out of range";
-    EXPECT_EQ(lines, (std::vector<std::string>{
-                         "Meter: 09:00:00.000 " + text,
-                         "Meter: 09:00:10.000 " + text + " ... repeated 10 times",
-                         "Meter: 09:00:20.000 " + text + " ... repeated 10 times"}));
+    EXPECT_EQ(lines,
+              (std::vector<std::string>{"Meter: 09:00:00.000 " + text,
+                                        "Meter: 09:00:10.000 " + text + " ... repeated 10 times",
+                                        "Meter: 09:00:20.000 " + text + " ... repeated 10 times"}));
 
     // The link coming back ends the run with what was left unsaid.
     lines.clear();
     tell("Meter", IncidentKind::Opened, "opened port 1");
-    EXPECT_EQ(lines, (std::vector<std::string>{
-                         "Meter: 09:00:25.000 " + text + " ... repeated 4 times",
-                         "Meter: 09:00:25.000 opened port 1"}));
+    EXPECT_EQ(lines,
+              (std::vector<std::string>{"Meter: 09:00:25.000 " + text + " ... repeated 4 times",
+                                        "Meter: 09:00:25.000 opened port 1"}));
     lines.clear();
     tell("Meter", IncidentKind::Error, text);
     EXPECT_EQ(lines, std::vector<std::string>{"Meter: 09:00:25.000 " + text}) << "a new run";
@@ -65,9 +66,9 @@ TEST_F(TracePrinting, RunsAreKeptPerNodeAndPerWords) {
 }
 
 TEST_F(TracePrinting, ProtocolIncidentsAreNeverCollapsed) {
-    for (const auto kind : {IncidentKind::Sent, IncidentKind::Received, IncidentKind::TimedOut,
-                            IncidentKind::Retried, IncidentKind::BadCheck, IncidentKind::Dropped,
-                            IncidentKind::Closed}) {
+    for (const auto kind :
+         {IncidentKind::Sent, IncidentKind::Received, IncidentKind::TimedOut, IncidentKind::Retried,
+          IncidentKind::BadCheck, IncidentKind::Dropped, IncidentKind::Closed}) {
         lines.clear();
         for (int i = 0; i < 3; ++i) tell("Plc", kind, "same words");
         EXPECT_EQ(lines.size(), 3u) << platform::IncidentKindName(kind);

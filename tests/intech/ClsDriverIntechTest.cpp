@@ -13,6 +13,7 @@
 #include "sim/intech/IntechSimulator.h"
 #include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
+#include "support/IncidentRecorder.h"
 #include "support/RuntimeFixture.h"
 
 namespace maroset {
@@ -104,6 +105,17 @@ TEST_F(IntechDriver, TagsOfOneGroupShareACommandAndTheSearchLeavesAnEmptyEntry) 
     db().StartScanning();
     advance(100ms);
     EXPECT_EQ(reported(), (Reports{{7, "2.5"}, {8, "4.0"}, {10, "4095"}}));
+}
+
+TEST_F(IntechDriver, AddTagFlagsATagNoPollCommandReads) {
+    test::IncidentRecorder incidents;
+    auto m = meter();
+    m->AddTag(9, "01LAI17");
+    m->AddTag(8, "01LAI4");
+    ASSERT_EQ(incidents.entries.size(), 1u) << ::testing::PrintToString(incidents.lines);
+    EXPECT_EQ(incidents.entries[0].tag, "01LAI17");
+    EXPECT_NE(incidents.entries[0].text.find("tag 01LAI17: no poll command reads it"),
+              std::string::npos);
 }
 
 TEST_F(IntechDriver, OnlyChangedTextsGoUpAndEveryAddItemReportsEverythingAgain) {

@@ -7,6 +7,8 @@
 #include <vector>
 
 #include "IntechFrames.h"
+#include "core/TracePrinter.h"
+#include "drivers/intech/IntechCollector.h"
 #include "platform/serial/MemorySerialCable.h"
 #include "support/ErrorOf.h"
 #include "support/IncidentRecorder.h"
@@ -176,6 +178,83 @@ TEST_F(IntechLine, BusyIsReadOnlyAndPLCWordCountReadsZero) {
     EXPECT_EQ(test::errorOf([&] { frm->Busy(1); }), 382);
     frm->PLCWordCount(2);
     EXPECT_EQ(frm->PLCWordCount(), 0);
+}
+
+// What the trace tells a person about the line, each line checked by its words.
+using IntechLineTrace = IntechLine;
+
+TEST_F(IntechLineTrace, AReplyCutShortByANewAtSignIsToldAndTheNewFrameDecoded) {
+    poll({"@01EX DI:"});
+    advance(100ms);
+    sent();
+    answer("@01EX DI 00" + WithBcc("@01OK:") + "\r");
+    EXPECT_TRUE(traced("Meter: reply cut short by a new \"@\" after 11 characters: @01EX DI 00"));
+    EXPECT_TRUE(traced("Meter: received @01OK:35"));
+    EXPECT_EQ(incidents_.find("cut short")->kind, platform::IncidentKind::Dropped);
+}
+
+TEST_F(IntechLineTrace, AnEndlessReplyIsDroppedWithOneLineAndTheNextReplyDecodes) {
+    poll({"@01EX DI:"});
+    advance(100ms);
+    sent();
+    answer("@01EX E1 " + std::string(3 * IntechCollector::FrameLimit, '7'));
+    EXPECT_EQ(incidents_.count("reply longer than 512 characters: dropped"), 1u);
+    answer(WithBcc("@01EX DI 0003 0015:") + "\r");
+    EXPECT_EQ(names.size(), 1u) << "the reply after the endless one is decoded";
+    EXPECT_TRUE(traced("characters outside a frame")) << "what came after the drop is counted";
+}
+
+TEST_F(IntechLineTrace, EveryIncidentNamesTheDeviceAndTheOpenSaysWhichPort) {
+    poll({"@01EX DI:"});
+    advance(100ms);
+    EXPECT_TRUE(traced("Meter: opened port 1 (/dev/ttyS0, 9600,n,8,1)"));
+    EXPECT_EQ(incidents_.find("sent @01EX DI:")->endpoint, "/dev/ttyS0");
+}
+
+TEST_F(IntechLineTrace, APortThatCannotOpenIsPrintedOnceThenSummarisedEveryTenSeconds) {
+    std::vector<std::string> printed;
+    TracePrinter printer(runtime().incidents(),
+                         [&](std::string_view line) { printed.emplace_back(line); });
+    runtime().mapSerialPort(1, "/nonexistent/intech", "meter");
+    poll({"@01EX DI:"});
+    advance(10'100ms);
+    const std::string open =
+        "Meter: 09:00:00.100 cannot open port 1: Cannot open serial device "
+        "/nonexistent/intech";
+    ASSERT_EQ(printed.size(), 4u) << ::testing::PrintToString(printed);
+    EXPECT_EQ(printed[0].rfind(open, 0), 0u) << printed[0];
+    EXPECT_EQ(printed[1].rfind("Meter: 09:00:00.100 error 8002 in Maroset.FrmNUVIntech: ", 0), 0u)
+        << printed[1];
+    EXPECT_TRUE(printed[2].starts_with("Meter: 09:00:10.100 cannot open port 1: ")) << printed[2];
+    EXPECT_TRUE(printed[2].ends_with(" ... repeated 100 times")) << printed[2];
+    EXPECT_TRUE(printed[3].ends_with(" ... repeated 100 times")) << printed[3];
+
+    // One more failing tick, then plugged in: the run ends with what was left unsaid, and the
+    // line opens.
+    advance(100ms);
+    EXPECT_EQ(printed.size(), 4u);
+    runtime().serialDevices().plug("/nonexistent/intech", cable.hostEnd());
+    printed.clear();
+    advance(100ms);
+    ASSERT_GE(printed.size(), 3u) << ::testing::PrintToString(printed);
+    EXPECT_TRUE(printed[0].starts_with("Meter: 09:00:10.300 cannot open port 1: ")) << printed[0];
+    EXPECT_TRUE(printed[0].ends_with(" ... repeated 1 times")) << printed[0];
+    EXPECT_EQ(printed[2], "Meter: 09:00:10.300 opened port 1 (/nonexistent/intech, 9600,n,8,1)");
+}
+
+TEST_F(IntechLineTrace, ANodeWithNoTagAndTheEmptyPollEntryAreExplained) {
+    frm->TmrScanRate.Enabled(true);
+    advance(100ms);
+    EXPECT_TRUE(
+        traced("Meter: no poll command: the node has no tag, so each tick fails with "
+               "error 9 until one is added"));
+    frm->PollCommand(1, "");
+    frm->PollCommand(0, "@01EX DI:");
+    advance(100ms);
+    answer(ok);
+    EXPECT_TRUE(
+        traced("Meter: sent 0<CR> (the poll list's empty entry, sent as the BCC of "
+               "nothing)"));
 }
 
 }  // namespace

@@ -45,7 +45,6 @@ class SoftPlcClient : public test::RuntimeFixture {
         advance(milliseconds(0));
     }
 
-
     // Lets the first tick of the acknowledgement timer pass: it finds the queue empty and
     // stops the timer, so the next send starts its count afresh.
     void settle() {
@@ -287,6 +286,42 @@ TEST_F(SoftPlcClient, AHandlerThatUnloadsAndReleasesTheClientEndsTheArrivalThere
     EXPECT_EQ(delivered.size(), 1u);
     EXPECT_EQ(wire(), frame("ACK", 1, "001"));
     advance(milliseconds(5000));  // the timer and the socket are gone with it
+}
+
+// What the trace tells a person about the connection, each line checked by its words.
+using SoftPlcClientTrace = SoftPlcClient;
+
+TEST_F(SoftPlcClientTrace, AFrameGivenUpAfterNaksIsTold) {
+    settle();
+    const std::string first = frame("TSL", 1, "a");
+    form->SendData("TSL", Variant("a"));
+    form->SendData("TSL", Variant("b"));
+    for (int n = 1; n <= 3; ++n) fromServer(frame("NAK", n, " "));
+    EXPECT_TRUE(incidents_.has("PLC1: frame given up after 3 NAKs: " + first));
+    EXPECT_EQ(incidents_.find("given up")->kind, platform::IncidentKind::Dropped);
+}
+
+TEST_F(SoftPlcClientTrace, APeerThatClosesIsToldAndItsQueueIsDroppedNotGivenUpForSilence) {
+    settle();
+    const std::string sent = frame("TSL", 1, "a");
+    form->SendData("TSL", Variant("a"));
+    link->serverEnd()->close();
+    advance(milliseconds(0));
+    EXPECT_EQ(trace.back(), "PLC1: connection closed by the server at plc:5000");
+    EXPECT_EQ(incidents_.entries.back().kind, platform::IncidentKind::Closed);
+    advance(milliseconds(1500));
+    EXPECT_EQ(trace.back(), "PLC1: frame dropped, not connected to plc:5000: " + sent);
+    EXPECT_FALSE(incidents_.has("Client giveup no reply")) << "it was not for want of a reply";
+}
+
+TEST_F(SoftPlcClientTrace, AFrameTheServerNeverAnswersIsGivenUpAsTimedOut) {
+    settle();
+    form->SendData("TSL", Variant("a"));
+    advance(milliseconds(7000));
+    const auto* giveup = incidents_.find("Client giveup no reply: ");
+    ASSERT_NE(giveup, nullptr);
+    EXPECT_EQ(giveup->kind, platform::IncidentKind::TimedOut);
+    EXPECT_EQ(giveup->endpoint, "plc:5000");
 }
 
 }  // namespace

@@ -22,8 +22,8 @@ class IncidentRecorder {
     };
 
     IncidentRecorder()
-        : reading_(Runtime::current().incidents().subscribe(
-              [this](const platform::LinkIncident& i) {
+        : reading_(
+              Runtime::current().incidents().subscribe([this](const platform::LinkIncident& i) {
                   entries.push_back({std::string(i.node()), i.kind(), std::string(i.endpoint()),
                                      std::string(i.tag()), i.text()});
                   lines.push_back(std::string(i.node()) + ": " + i.text());

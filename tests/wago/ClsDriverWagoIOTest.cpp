@@ -13,8 +13,8 @@
 #include "sim/wago/WagoCouplerSimulator.h"
 #include "support/ErrorOf.h"
 #include "support/HostRecorder.h"
-#include "support/RuntimeFixture.h"
 #include "support/IncidentRecorder.h"
+#include "support/RuntimeFixture.h"
 
 namespace maroset::test {
 namespace {
@@ -391,7 +391,8 @@ TEST_F(WagoDiagnostics, TheTraceTellsEachFailedCallAndEveryReconnect) {
     EXPECT_EQ(failedRead->tag, "IW300");
     EXPECT_EQ(failedRead->endpoint, "127.0.0.1:" + port);
     EXPECT_THAT(lines, Contains("Coupler: reconnecting to the coupler at 127.0.0.1 (last "
-                                "127.0.0.1:" + port + ")"));
+                                "127.0.0.1:" +
+                                port + ")"));
     EXPECT_THAT(lines, Contains("Coupler: disconnected from the coupler at 127.0.0.1:" + port));
     EXPECT_THAT(lines, Contains("Coupler: cannot connect to the coupler at 127.0.0.1:" + port +
                                 ": status 261, Could not connect to the coupler (Connection "
@@ -408,14 +409,43 @@ TEST_F(WagoDiagnostics, AnErrorThatLeavesAPassIsTracedAndTheNextTickScansAgain) 
     tick();
     // Connecting, connected, the tag flagged when added, then per pass the tag and the error.
     ASSERT_EQ(lines.size(), 7u) << ::testing::PrintToString(lines);
-    EXPECT_EQ(lines[2], "Coupler: tag IWx: \"x\" is not a tag number: every scan pass stops at "
-                        "it with error 13 (Type mismatch), and the tags after it are not read");
+    EXPECT_EQ(lines[2],
+              "Coupler: tag IWx: \"x\" is not a tag number: every scan pass stops at "
+              "it with error 13 (Type mismatch), and the tags after it are not read");
     EXPECT_EQ(lines[3], "Coupler: tag IWx stops the pass: error 13 (Type mismatch)");
     EXPECT_EQ(lines[4], "Coupler: error 13 in Maroset.ClsDriverWagoIO: Type mismatch (127.0.0.1:" +
                             std::to_string(coupler.port()) + ")");
     EXPECT_EQ(lines[5], lines[3]);
     EXPECT_EQ(coupler.requests(), (std::vector<Request>{{kFc04, 0, 1}, {kFc04, 0, 1}}));
     EXPECT_TRUE(host.changes.empty());
+}
+
+TEST_F(WagoDiagnostics, AddTagFlagsTagsThatStopEveryPassOrThatNoReadPolls) {
+    test::IncidentRecorder incidents;
+    n = makeNode();
+    scan({"IW0", "OW32700", "XW3"});
+    EXPECT_TRUE(
+        incidents.has("Coupler: tag OW32700: its read-back address 33212 passes 32767: "
+                      "every scan pass stops at it with error 6 (Overflow), and the tags "
+                      "after it are not read"));
+    EXPECT_TRUE(
+        incidents.has("Coupler: tag XW3: no read polls it: \"XW\" is none of IW, OW, "
+                      "ID, OD"));
+    EXPECT_EQ(incidents.find("tag OW32700:")->tag, "OW32700");
+    tick();
+    EXPECT_TRUE(incidents.has("Coupler: tag OW32700 stops the pass: error 6 (Overflow)"));
+}
+
+TEST_F(WagoDiagnostics, AnAddressThatIsNotADottedIpv4AddressIsHinted) {
+    test::IncidentRecorder incidents;
+    n = makeNode(Variant("localhost"));
+    const auto* failed = incidents.find("cannot connect to the coupler at localhost:");
+    ASSERT_NE(failed, nullptr) << ::testing::PrintToString(incidents.lines);
+    EXPECT_NE(failed->text.find("; IPAddress \"localhost\" is not a dotted IPv4 address such as "
+                                "192.168.1.10"),
+              std::string::npos)
+        << failed->text;
+    EXPECT_EQ(failed->kind, platform::IncidentKind::OpenFailed);
 }
 
 TEST_F(WagoDiagnostics, WithTheTrapOnTheScanLogsUnderItsOwnLabel) {
