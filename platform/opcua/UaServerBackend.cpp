@@ -203,12 +203,14 @@ UaServerBackend::~UaServerBackend() {
 void UaServerBackend::trace(const std::string& text, uint32_t status, IncidentKind kind) {
     if (!incidents_.wanted()) return;
     if (kind == IncidentKind::Note && IsBad(status)) kind = IncidentKind::Refused;
-    const auto words = [&] { return text + (status ? " (" + StatusName(status) + ")" : ""); };
+    const auto said = [&] { return text + (status ? " (" + StatusName(status) + ")" : ""); };
     // Before any group has an item the node is not known yet: the endpoint stands for it.
     if (nodes_.empty()) {
-        incidents_.report(url_, kind, url_, words);
+        incidents_.report(url_, kind, url_, said);
         return;
     }
+    // A node's line names the server too: a person reads which one failed.
+    const auto words = [&] { return url_ + ": " + said(); };
     for (const auto& node : nodes_) incidents_.report(node, kind, url_, words);
 }
 
