@@ -38,6 +38,7 @@ HttpResponse ServeApi::handle(const HttpRequest& request) {
     constexpr std::string_view tagPrefix = "/api/tags/";
     if (path == "/api/nodes") return only(get, [&] { return nodes(); });
     if (path == "/api/tags") return only(get, [&] { return tags(); });
+    if (path == "/api/info") return only(get, [&] { return info(); });
     if (path.starts_with(tagPrefix)) {
         return only(request.method == "POST",
                     [&] { return write(request, path.substr(tagPrefix.size())); });
@@ -70,6 +71,13 @@ HttpResponse ServeApi::nodes() const {
     for (const LinkStatus& s : links_.All()) LinkStatusJson::Write(j, s);
     if (mqtt_) mqtt_->status().writeJson(j);
     return HttpResponse::Json(j.endArray().str());
+}
+
+HttpResponse ServeApi::info() const {
+    JsonWriter j;
+    j.beginObject().key("writes").boolean(writes_.allowed);
+    j.key("token").boolean(writes_.allowed && !writes_.token.empty());
+    return HttpResponse::Json(j.endObject().str());
 }
 
 HttpResponse ServeApi::tags() const {

@@ -46,6 +46,8 @@ class ServeApi {
 
   private:
     HttpResponse nodes() const;
+    // What the page needs to offer writes: {"writes": allowed, "token": a token is needed}.
+    HttpResponse info() const;
     HttpResponse tags() const;
     HttpResponse write(const HttpRequest& request, std::string_view target);
 

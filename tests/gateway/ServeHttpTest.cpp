@@ -146,9 +146,12 @@ TEST_F(ServeHttp, WritesAreRefusedUnlessAllowedAndAuthorised) {
     auto& http = serve();
     EXPECT_EQ(refusal(http.request("POST", "/api/tags/Mem/1", R"({"value":1})")),
               "403 writes are not allowed");
+    // The page learns from /api/info whether to offer write boxes and a token field.
+    EXPECT_EQ(http.request("GET", "/api/info").body, R"({"writes":false,"token":false})");
     service_.reset();
 
     auto& guarded = serve(writable("s3cret"));
+    EXPECT_EQ(guarded.request("GET", "/api/info").body, R"({"writes":true,"token":true})");
     EXPECT_EQ(guarded.request("POST", "/api/tags/Mem/1", R"({"value":1})").status, 401);
     EXPECT_EQ(
         guarded
@@ -175,6 +178,7 @@ TEST_F(ServeHttp, AnAddressBeyondLoopbackWithoutTokenRefusesWritesWhateverTheFla
     open.host = "0.0.0.0";
     auto& http = serve(open);
     EXPECT_FALSE(service_->writesAllowed());
+    EXPECT_EQ(http.request("GET", "/api/info").body, R"({"writes":false,"token":false})");
     EXPECT_EQ(http.request("POST", "/api/tags/Mem/1", R"({"value":1})").status, 403);
     service_.reset();
 
