@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "BenchRuntime.h"
+#include "MemoryTagYardstick.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
@@ -79,22 +80,7 @@ BENCHMARK(LoopTimerTickAlone);
 
 // The memory tag path, one value per report, as bench/spine_bench.cpp measures it.
 void MemoryTagPerValue(benchmark::State& state) {
-    platform::VirtualEventLoop* loop = nullptr;
-    ScopedRuntime scope(bench::VirtualRuntime(&loop));
-    ClsNodeDBInterface host;
-    int64_t received = 0;
-    auto sub =
-        host.ValueChange.subscribe([&](VbArray<int32_t>& ids, int16_t n, VbArray<Variant>& values) {
-            received += n;
-            benchmark::DoNotOptimize(ids(1));
-            benchmark::DoNotOptimize(values(1));
-        });
-    auto db = host.nodeDB();
-    db->AddNode("Line1", "MEMTAG");
-    const auto line1 = db->getNode("Line1");
-    line1->AddTag(12, "Level");
-    const Variant value(int32_t{35});
-    for (auto _ : state) line1->WriteTag("12", value);
+    const int64_t received = bench::MemoryTagRoundTrips(state, Variant(int32_t{35}));
     state.SetItemsProcessed(received);
     state.counters["ns_per_item"] = benchmark::Counter(
         static_cast<double>(received), benchmark::Counter::kIsRate | benchmark::Counter::kInvert);

@@ -20,6 +20,7 @@
 #include <vector>
 
 #include "BenchRuntime.h"
+#include "MemoryTagYardstick.h"
 #include "core/ClsNodeDBInterface.h"
 #include "core/Runtime.h"
 #include "core/ScopedRuntime.h"
@@ -100,21 +101,7 @@ void UaNotificationDecodePerValue(benchmark::State& state) {
 BENCHMARK(UaNotificationDecodePerValue)->Arg(1)->Arg(100)->Arg(1000);
 
 void MemoryTagPerValue(benchmark::State& state) {
-    ScopedRuntime scope(bench::VirtualRuntime());
-    ClsNodeDBInterface host;
-    int64_t received = 0;
-    auto sub =
-        host.ValueChange.subscribe([&](VbArray<int32_t>& ids, int16_t n, VbArray<Variant>& values) {
-            received += n;
-            benchmark::DoNotOptimize(ids(1));
-            benchmark::DoNotOptimize(values(1));
-        });
-    auto db = host.nodeDB();
-    db->AddNode("Line1", "MEMTAG");
-    const auto line1 = db->getNode("Line1");
-    line1->AddTag(12, "Level");
-    const Variant value(3.5);
-    for (auto _ : state) line1->WriteTag("12", value);
+    bench::MemoryTagRoundTrips(state, Variant(3.5));
     state.SetItemsProcessed(state.iterations());
     state.counters["ns_per_value"] =
         benchmark::Counter(static_cast<double>(state.iterations()),
