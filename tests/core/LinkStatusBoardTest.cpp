@@ -45,12 +45,14 @@ class LinkStatusBoardTest : public test::RuntimeFixture {
 };
 
 TEST_F(LinkStatusBoardTest, IncidentsMoveTheStateAndTheCounters) {
-    auto plc = start("Plc", Variant("NUVTCPIP"));
+    // A DF1 node opens its port only when it first polls: nothing but the incidents below
+    // moves its link.
+    auto plc = start("Plc", Variant("NUVABDF1"));
     std::vector<std::string> changes;
     const auto sub = runtime().linkStatus().StateChanged.subscribe(
         [&](const LinkStatus& s) { changes.push_back(s.node + "=" + std::string(LinkStateName(s.state))); });
     EXPECT_EQ(status("plc").state, LinkState::Connecting);  // any letter case finds it
-    EXPECT_EQ(status("Plc").driver, "NUVTCPIP");
+    EXPECT_EQ(status("Plc").driver, "NUVABDF1");
 
     tell("Plc", IncidentKind::Opening, "connecting to 127.0.0.1:5000", "127.0.0.1:5000");
     tell("Plc", IncidentKind::Opened, "connected to 127.0.0.1:5000", "127.0.0.1:5000");
