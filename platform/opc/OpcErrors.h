@@ -43,6 +43,11 @@ inline constexpr int32_t CO_E_CLASSSTRING = Code(0x800401F3);
 inline constexpr int32_t OPC_QUALITY_BAD = 0x00;
 inline constexpr int32_t OPC_QUALITY_UNCERTAIN = 0x40;
 inline constexpr int32_t OPC_QUALITY_GOOD = 0xC0;  // 192
+// Bad qualities with their sub-status, as servers that lose their source report them.
+inline constexpr int32_t OPC_QUALITY_CONFIG_ERROR = 0x04;
+inline constexpr int32_t OPC_QUALITY_NOT_CONNECTED = 0x08;
+inline constexpr int32_t OPC_QUALITY_COMM_FAILURE = 0x18;
+inline constexpr int32_t OPC_QUALITY_OUT_OF_SERVICE = 0x1C;
 
 // The text of a result code as a Windows server gives it from its message table: the
 // standard's wording followed by CR LF ("The value of the handle is invalid.\r\n"). Nothing

@@ -10,14 +10,6 @@ namespace maroset::platform::opcua {
 
 namespace {
 
-// Data Access quality words.
-constexpr int32_t QualityGood = 192;
-constexpr int32_t QualityUncertain = 64;
-constexpr int32_t QualityConfigError = 4;
-constexpr int32_t QualityNotConnected = 8;
-constexpr int32_t QualityCommFailure = 24;
-constexpr int32_t QualityOutOfService = 28;
-
 constexpr uint32_t MonitoringDisabled = 0;
 constexpr uint32_t MonitoringReporting = 2;
 constexpr uint8_t AccessCurrentWrite = 0x02;
@@ -26,27 +18,27 @@ constexpr std::chrono::milliseconds CallWait{2500};  // the client gives up at 2
 int32_t qualityOf(uint32_t status) {
     switch (status >> 30) {
         case 0:
-            return QualityGood;
+            return opc::OPC_QUALITY_GOOD;
         case 1:
-            return QualityUncertain;
+            return opc::OPC_QUALITY_UNCERTAIN;
         default:
             break;
     }
     switch (status & 0xFFFF0000u) {
         case status::BadNotConnected:
         case status::BadServerNotConnected:
-            return QualityNotConnected;
+            return opc::OPC_QUALITY_NOT_CONNECTED;
         case status::BadCommunicationError:
         case status::BadNoCommunication:
         case status::BadTimeout:
-            return QualityCommFailure;
+            return opc::OPC_QUALITY_COMM_FAILURE;
         case status::BadOutOfService:
-            return QualityOutOfService;
+            return opc::OPC_QUALITY_OUT_OF_SERVICE;
         case status::BadConfigurationError:
         case status::BadNodeIdUnknown:
         case status::BadNodeIdInvalid:
         case status::BadTypeMismatch:
-            return QualityConfigError;
+            return opc::OPC_QUALITY_CONFIG_ERROR;
         default:
             return 0;
     }
@@ -262,7 +254,7 @@ int32_t UaServerBackend::AddItem(const std::string& itemID, std::shared_ptr<OpcI
     const uint32_t handle = nextHandle_++;
     const bool active = client_->state() == UaClient::State::Active;
     auto ua = std::make_shared<UaItem>(shared_from_this(), itemID, std::move(node), handle,
-                                       everActive_ ? QualityCommFailure : QualityNotConnected);
+                                       everActive_ ? opc::OPC_QUALITY_COMM_FAILURE : opc::OPC_QUALITY_NOT_CONNECTED);
     items_[handle] = ua.get();
     if (active) {
         // Checked now: the caller learns at once whether the server knows the node.
@@ -270,7 +262,7 @@ int32_t UaServerBackend::AddItem(const std::string& itemID, std::shared_ptr<OpcI
         waitFor([&ua] { return ua->resolved_ || ua->failed_; }, CallWait);
         if (ua->failed_) {
             const int32_t result =
-                ua->state_.quality == QualityConfigError && ua->dataType_ == BuiltIn::Null
+                ua->state_.quality == opc::OPC_QUALITY_CONFIG_ERROR && ua->dataType_ == BuiltIn::Null
                     ? opc::OPC_E_UNKNOWNITEMID
                     : opc::E_FAIL;
             return result;
@@ -372,7 +364,7 @@ void UaServerBackend::onState(UaClient::State s) {
         resolveAll();
     } else if (s == UaClient::State::Backoff) {
         syncing_ = false;
-        badQuality(everActive_ ? QualityCommFailure : QualityNotConnected);
+        badQuality(everActive_ ? opc::OPC_QUALITY_COMM_FAILURE : opc::OPC_QUALITY_NOT_CONNECTED);
     }
 }
 
@@ -386,7 +378,7 @@ void UaServerBackend::resolveAll() {
             const auto it = std::find(ns.begin(), ns.end(), item->node_.namespaceUri);
             if (it == ns.end()) {
                 item->failed_ = true;
-                item->state_.quality = QualityConfigError;
+                item->state_.quality = opc::OPC_QUALITY_CONFIG_ERROR;
                 trace("item " + item->itemID_ + ": the server has no namespace " +
                           item->node_.namespaceUri,
                       status::BadNodeIdUnknown);
@@ -444,7 +436,7 @@ void UaServerBackend::resolveAll() {
                                                                         status::BadNodeIdUnknown)) {
                     item.failed_ = true;
                     item.dataType_ = BuiltIn::Null;
-                    item.state_.quality = QualityConfigError;
+                    item.state_.quality = opc::OPC_QUALITY_CONFIG_ERROR;
                     item.state_.timeStamp = now;
                     trace("item " + item.itemID_ + " refused", refused);
                     continue;
@@ -598,7 +590,7 @@ void UaServerBackend::sync() {
                     if (IsBad(st)) {
                         item.failed_ = true;
                         item.resolved_ = false;
-                        item.state_.quality = qualityOf(st) ? qualityOf(st) : QualityConfigError;
+                        item.state_.quality = qualityOf(st) ? qualityOf(st) : opc::OPC_QUALITY_CONFIG_ERROR;
                         trace("monitored item " + item.itemID_ + " refused", st);
                         continue;
                     }
